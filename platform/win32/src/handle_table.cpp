@@ -1,0 +1,35 @@
+#include "handle_table.h"
+
+namespace win32 {
+
+HANDLE HandleTable::Insert(HandleKind kind, std::shared_ptr<void> object) {
+  std::lock_guard<std::mutex> lock(mutex_);
+  // Steps of 4 keep handles looking like Windows handles and never hit INVALID_HANDLE_VALUE.
+  const std::uintptr_t value = next_;
+  next_ += 4;
+  entries_.emplace(value, Entry{kind, std::move(object)});
+  return reinterpret_cast<HANDLE>(value);
+}
+
+std::shared_ptr<void> HandleTable::Find(HANDLE handle, HandleKind kind) const {
+  std::lock_guard<std::mutex> lock(mutex_);
+  auto it = entries_.find(reinterpret_cast<std::uintptr_t>(handle));
+  if (it == entries_.end() || it->second.kind != kind) return nullptr;
+  return it->second.object;
+}
+
+std::shared_ptr<void> HandleTable::Take(HANDLE handle, HandleKind kind) {
+  std::lock_guard<std::mutex> lock(mutex_);
+  auto it = entries_.find(reinterpret_cast<std::uintptr_t>(handle));
+  if (it == entries_.end() || it->second.kind != kind) return nullptr;
+  std::shared_ptr<void> object = std::move(it->second.object);
+  entries_.erase(it);
+  return object;
+}
+
+HandleTable& Handles() {
+  static HandleTable* table = new HandleTable;  // never destroyed: handles may outlive statics
+  return *table;
+}
+
+}  // namespace win32

@@ -1,0 +1,35 @@
+#include "win32_paths.h"
+
+#include <unistd.h>
+
+#include <cctype>
+#include <climits>
+
+namespace win32 {
+
+std::optional<std::string> PosixPathFromWindows(const std::string& windowsPath) {
+  if (windowsPath.size() < 3) return std::nullopt;
+  if (std::toupper(static_cast<unsigned char>(windowsPath[0])) != 'Z' || windowsPath[1] != ':')
+    return std::nullopt;
+  if (windowsPath[2] != '\\' && windowsPath[2] != '/') return std::nullopt;
+  std::string posix = windowsPath.substr(2);
+  for (char& c : posix)
+    if (c == '\\') c = '/';
+  return posix;
+}
+
+std::string WindowsPathFromPosix(const std::string& posixPath) {
+  std::string absolute = posixPath;
+  if (absolute.empty() || absolute[0] != '/') {
+    char cwd[PATH_MAX];
+    std::string base = getcwd(cwd, sizeof cwd) ? cwd : "/";
+    if (base.back() != '/') base += '/';
+    absolute = base + absolute;
+  }
+  std::string windows = "Z:" + absolute;
+  for (char& c : windows)
+    if (c == '/') c = '\\';
+  return windows;
+}
+
+}  // namespace win32
