@@ -1,0 +1,20 @@
+#include "error_state.h"
+
+#include <cstring>
+
+#include "debugger.h"
+#include "host_bridge.h"
+
+int32_t LastCMError;
+char LastCMErrorMessage[256];
+
+void SetCMError(int32_t code) {
+  LastCMError = code;
+  if (code != 0) SendDebugError(LastCMError, LastCMErrorMessage);
+}
+
+int32_t CMError() { return LastCMError; }
+
+REALstring CMErrorMessage() {
+  return bridge::BuildString(LastCMErrorMessage, static_cast<int32_t>(std::strlen(LastCMErrorMessage)));
+}
