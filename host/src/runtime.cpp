@@ -121,6 +121,7 @@ struct Runtime::Impl {
   std::unordered_set<REALobject> liveObjects;
   std::unordered_set<REALstring> liveStrings;
   std::vector<std::string> faults;
+  std::size_t eventLookups = 0;
 
   void Fault(std::string text) {
     std::fprintf(stderr, "host: %s\n", text.c_str());
@@ -495,6 +496,7 @@ static void EntryREALLockString(REALstring s) { Active().LockString(s); }
 static void EntryREALUnlockString(REALstring s) { Active().UnlockString(s); }
 static REALproc EntryGetEventInstance(REALobject o, intptr_t eventWord) {
   Runtime::Impl& rt = Active();
+  ++rt.eventLookups;
   if (!o || !rt.liveObjects.count(o) || !o->extras) return nullptr;
   for (auto& b : o->extras->events)
     if (b->eventId == eventWord) return reinterpret_cast<REALproc>(b->code);
@@ -635,7 +637,8 @@ Runtime::Runtime(const std::string& pluginPath, Options options) : impl_(std::ma
   impl_->folderItemClass = std::make_unique<ClassEntry>();
   impl_->folderItemClass->info.name = "FolderItem";
 
-  impl_->library = dlopen(pluginPath.c_str(), RTLD_NOW | RTLD_LOCAL);
+  // An empty path loads the running program itself, for tests that link a plugin in.
+  impl_->library = dlopen(pluginPath.empty() ? nullptr : pluginPath.c_str(), RTLD_NOW | RTLD_LOCAL);
   if (!impl_->library) {
     const char* why = dlerror();
     throw HostError("cannot load plugin " + pluginPath + ": " + (why ? why : "unknown error"));
@@ -776,5 +779,6 @@ const std::vector<std::string>& Runtime::ResolvedEntries() const { return impl_-
 std::size_t Runtime::LiveObjects() const { return impl_->liveObjects.size(); }
 std::size_t Runtime::LiveStrings() const { return impl_->liveStrings.size(); }
 const std::vector<std::string>& Runtime::Faults() const { return impl_->faults; }
+std::size_t Runtime::EventLookups() const { return impl_->eventLookups; }
 
 }  // namespace host

@@ -67,7 +67,8 @@ class Runtime {
 
   // Loads the plugin and calls its REALPluginMain. One Runtime may be alive at a time,
   // since a plugin's resolver carries no context. Unloads the plugin on destruction;
-  // every Object must be gone by then.
+  // every Object must be gone by then. An empty path means the running program, for
+  // tests that link a plugin's code in and export its REALPluginMain.
   explicit Runtime(const std::string& pluginPath, Options options = {});
   ~Runtime();
   Runtime(const Runtime&) = delete;
@@ -104,6 +105,8 @@ class Runtime {
   std::size_t LiveObjects() const;
   std::size_t LiveStrings() const;
   const std::vector<std::string>& Faults() const;
+  // How often the plugin asked for an event handler.
+  std::size_t EventLookups() const;
 
   struct Impl;
 

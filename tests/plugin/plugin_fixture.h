@@ -1,0 +1,61 @@
+// A runtime with the plugin loaded, for tests that drive it as a script would. At the
+// end of every test no object or string may be left alive, and the host must have seen
+// no misuse of references.
+#ifndef TINTWELL_TESTS_PLUGIN_FIXTURE_H
+#define TINTWELL_TESTS_PLUGIN_FIXTURE_H
+
+#include <gtest/gtest.h>
+
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "host/runtime.h"
+
+class PluginTest : public ::testing::Test {
+ protected:
+  explicit PluginTest(std::string pluginPath = TINTWELL_PLUGIN_PATH) : pluginPath_(std::move(pluginPath)) {}
+
+  void SetUp() override { rt = std::make_unique<host::Runtime>(pluginPath_, options); }
+
+  void TearDown() override {
+    // The plugin's own long-lived reference: a registered debugger.
+    rt->CallGlobal("halvoUnregisterDebugger");
+    EXPECT_EQ(rt->LiveObjects(), 0u) << "objects left alive";
+    EXPECT_EQ(rt->LiveStrings(), 0u) << "strings left alive";
+    EXPECT_TRUE(rt->Faults().empty()) << rt->Faults().front();
+    rt.reset();
+  }
+
+  host::Runtime::Options options;
+  std::unique_ptr<host::Runtime> rt;
+
+ private:
+  std::string pluginPath_;
+};
+
+// Records every event a debugger raises, in order, as "Name:value".
+class EventLog {
+ public:
+  void Attach(host::Runtime& rt, const host::Object& debugger) {
+    for (const char* name : {"DebugError", "DebugInteger", "DebugDouble", "DebugBoolean", "DebugString"}) {
+      const std::string event = name;
+      rt.SetEventHandler(debugger, event, [this, event](const host::Object&, const std::vector<host::Value>& args) {
+        std::string text = event + ":";
+        for (std::size_t i = 0; i < args.size(); ++i) {
+          const host::Value& v = args[i];
+          if (i) text += ",";
+          if (v.IsString()) text += v.AsString();
+          else if (v.IsInteger()) text += std::to_string(v.AsInteger());
+          else if (v.IsBoolean()) text += v.AsBoolean() ? "true" : "false";
+          else if (v.IsDouble()) text += std::to_string(v.AsDouble());
+        }
+        entries.push_back(text);
+        return host::Value();
+      });
+    }
+  }
+  std::vector<std::string> entries;
+};
+
+#endif

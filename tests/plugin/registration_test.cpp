@@ -1,0 +1,89 @@
+// The plugin as the host sees it after loading: what it registers, and how it copes
+// with a host that lacks entries.
+#include <sys/stat.h>
+
+#include <algorithm>
+
+#include "plugin_fixture.h"
+#include "win32_paths.h"
+
+namespace {
+
+using host::Object;
+using host::Value;
+
+TEST_F(PluginTest, RegistersItsClassesAndGlobalsWithTheStoredDeclarations) {
+  EXPECT_EQ(rt->pluginVersion(), 5);
+  EXPECT_TRUE(rt->RegistrationErrors().empty());
+
+  const auto classes = rt->Classes();
+  ASSERT_EQ(classes.size(), 1u);
+  const host::ClassInfo& debugger = *classes[0];
+  EXPECT_EQ(debugger.name, "halvoDebugger");
+  EXPECT_EQ(debugger.dataSize, 1u);
+  ASSERT_EQ(debugger.properties.size(), 1u);
+  EXPECT_EQ(debugger.properties[0].name, "UseErrorEvent");
+  EXPECT_EQ(debugger.properties[0].type.kind, host::TypeKind::Boolean);
+  EXPECT_FALSE(debugger.properties[0].readOnly);
+  std::vector<std::string> methods, events, globals;
+  for (const auto& m : debugger.methods) methods.push_back(m.declaration);
+  for (const auto& e : debugger.events) events.push_back(e.declaration);
+  for (const auto* g : rt->Globals()) globals.push_back(g->declaration);
+  EXPECT_EQ(methods, (std::vector<std::string>{"halvoDebugger(useErrorEvent as boolean)", "halvoDebugger()"}));
+  EXPECT_EQ(events, (std::vector<std::string>{
+                        "DebugError(err as integer, errMessage as string)", "DebugInteger(aInteger as integer)",
+                        "DebugDouble(aDouble as double)", "DebugBoolean(aBoolean as boolean)",
+                        "DebugString(aString as string)"}));
+  EXPECT_EQ(globals, (std::vector<std::string>{"halvoRegisterDebugger(debugger as halvoDebugger)",
+                                               "halvoUnregisterDebugger()", "CMError() as Integer",
+                                               "CMErrorMessage() as string"}));
+}
+
+TEST_F(PluginTest, StartsByAnnouncingItsVersionThenRegisters) {
+  const auto& resolved = rt->ResolvedEntries();
+  ASSERT_GE(resolved.size(), 3u);
+  EXPECT_EQ(resolved[0], "RegisterPluginVersion");
+  EXPECT_EQ(resolved[1], "PluginRegisterClass");
+  EXPECT_EQ(resolved[2], "PluginRegisterMethod");
+  // Each entry is resolved once and then served from the cache.
+  EXPECT_EQ(std::count(resolved.begin(), resolved.end(), "PluginRegisterClass"), 1);
+}
+
+TEST_F(PluginTest, CreatesItsTemporaryFolderBesideTheExecutable) {
+  Object debugger = rt->New("halvoDebugger");
+  EventLog log;
+  log.Attach(*rt, debugger);
+  rt->CallGlobal("halvoRegisterDebugger", {debugger});
+  ASSERT_EQ(log.entries.size(), 2u);
+  const std::string folder = log.entries[1].substr(std::string("DebugString:").size());
+  ASSERT_EQ(folder.back(), '\\');
+  EXPECT_EQ(folder.substr(folder.size() - 6), "\\temp\\");
+  const auto posix = win32::PosixPathFromWindows(folder);
+  ASSERT_TRUE(posix);
+  struct stat st;
+  ASSERT_EQ(stat(posix->c_str(), &st), 0) << *posix;
+  EXPECT_TRUE(S_ISDIR(st.st_mode));
+}
+
+class WithheldEntryTest : public PluginTest {
+ protected:
+  WithheldEntryTest() { options.withheld = {"GetEventInstance", "REALBuildString"}; }
+};
+
+TEST_F(WithheldEntryTest, BridgeCallsYieldNothingUntilTheEntryAppears) {
+  Object debugger = rt->New("halvoDebugger");
+  EventLog log;
+  log.Attach(*rt, debugger);
+  rt->CallGlobal("halvoRegisterDebugger", {debugger});
+  EXPECT_TRUE(log.entries.empty());  // no event lookup, so no events
+  EXPECT_EQ(rt->CallGlobal("CMErrorMessage").AsString(), "");  // a nil string reads as empty
+  rt->CallGlobal("halvoUnregisterDebugger");
+
+  rt->SetWithheld("GetEventInstance", false);
+  rt->SetWithheld("REALBuildString", false);
+  rt->CallGlobal("halvoRegisterDebugger", {debugger});
+  ASSERT_EQ(log.entries.size(), 2u);  // resolution was retried
+  EXPECT_EQ(log.entries[0], "DebugString:DIRECTORY:");
+}
+
+}  // namespace
