@@ -1,5 +1,6 @@
 #include "registration.h"
 
+#include "cmcolor.h"
 #include "debugger.h"
 #include "error_state.h"
 #include "host_bridge.h"
@@ -10,6 +11,7 @@ namespace {
 // CMColor, Profile, ColorWorld, cLut. A class joins this list once it is built.
 REALclassDefinition* const kClasses[] = {
     &halvoDebuggerClass,
+    &CMColorClass,
 };
 
 // Global methods in registration order; a method joins this table once it is built.

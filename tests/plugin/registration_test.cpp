@@ -17,7 +17,9 @@ TEST_F(PluginTest, RegistersItsClassesAndGlobalsWithTheStoredDeclarations) {
   EXPECT_TRUE(rt->RegistrationErrors().empty());
 
   const auto classes = rt->Classes();
-  ASSERT_EQ(classes.size(), 1u);
+  std::vector<std::string> names;
+  for (const auto* c : classes) names.push_back(c->name);
+  EXPECT_EQ(names, (std::vector<std::string>{"halvoDebugger", "CMColor"}));
   const host::ClassInfo& debugger = *classes[0];
   EXPECT_EQ(debugger.name, "halvoDebugger");
   EXPECT_EQ(debugger.dataSize, 1u);
@@ -37,6 +39,14 @@ TEST_F(PluginTest, RegistersItsClassesAndGlobalsWithTheStoredDeclarations) {
   EXPECT_EQ(globals, (std::vector<std::string>{"halvoRegisterDebugger(debugger as halvoDebugger)",
                                                "halvoUnregisterDebugger()", "CMError() as Integer",
                                                "CMErrorMessage() as string"}));
+
+  const host::ClassInfo& color = *classes[1];
+  EXPECT_EQ(color.properties.size(), 25u);
+  EXPECT_EQ(color.methods.size(), 16u);
+  // Two declarations share one routine.
+  EXPECT_EQ(color.methods[1].declaration, "CMColor(c as CMColor)");
+  EXPECT_EQ(color.methods[2].declaration, "copy(c as CMColor)");
+  EXPECT_EQ(color.methods[1].function, color.methods[2].function);
 }
 
 TEST_F(PluginTest, StartsByAnnouncingItsVersionThenRegisters) {
