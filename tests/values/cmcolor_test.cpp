@@ -81,7 +81,8 @@ TEST_F(CMColorTest, EachSetterStoresItsWordAndRecordsItsColourType) {
     const auto words = Words(color);
     EXPECT_EQ(words[c.word], c.stored) << c.property << " = " << c.value;
     for (int n = 0; n < 4; ++n) {
-      if (n != c.word) EXPECT_EQ(words[n], 0) << c.property << " touched word " << n;
+      if (n == c.word) continue;
+      EXPECT_EQ(words[n], 0) << c.property << " touched word " << n;
     }
     EXPECT_EQ(TypeOf(color), c.type) << c.property;
   }
