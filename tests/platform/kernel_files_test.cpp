@@ -45,7 +45,9 @@ class FileTest : public ::testing::Test {
   void TearDown() override { std::system(("rm -rf '" + root_ + "'").c_str()); }
 
   std::string Posix(const std::string& name) const { return root_ + "/" + name; }
-  std::string Win(const std::string& name) const { return win32::WindowsPathFromPosix(Posix(name)); }
+  std::string Win(const std::string& name) const {
+    return win32::WindowsPathFromPosix(Posix(name));
+  }
   void Put(const std::string& name, const std::string& bytes) const {
     std::ofstream(Posix(name), std::ios::binary) << bytes;
   }
@@ -62,7 +64,8 @@ class FileTest : public ::testing::Test {
     std::set<std::string> names;
     DIR* dir = opendir(root_.c_str());
     while (const dirent* e = readdir(dir))
-      if (std::strcmp(e->d_name, ".") != 0 && std::strcmp(e->d_name, "..") != 0) names.insert(e->d_name);
+      if (std::strcmp(e->d_name, ".") != 0 && std::strcmp(e->d_name, "..") != 0)
+        names.insert(e->d_name);
     closedir(dir);
     return names;
   }
@@ -122,7 +125,8 @@ TEST_F(CopyFileATest, CopiesContentTimeAndReadOnlyBitAndReplacesWhole) {
     EXPECT_EQ(st.st_mtime, kY2k);
     EXPECT_EQ(st.st_mode & S_IWUSR, 0u);
   }
-  EXPECT_EQ(Listing(), (std::set<std::string>{"big", "copy", "dst", "ro", "dir"}));  // no temporary left
+  // No temporary file is left behind.
+  EXPECT_EQ(Listing(), (std::set<std::string>{"big", "copy", "dst", "ro", "dir"}));
 }
 
 // Copies with writes beyond 64 KiB failing, as on a full disk; exits 0 when the copy
@@ -278,8 +282,8 @@ TEST_F(CreateFileATest, EachDispositionOnAMissingAndAnExistingFile) {
       const DWORD code = exists ? c.onExisting : c.onMissing;
       const bool opens = code == ERROR_SUCCESS || code == ERROR_ALREADY_EXISTS;
       SetLastError(kSentinel);
-      HANDLE h = CreateFileA(Win("f").c_str(), GENERIC_READ | GENERIC_WRITE, 0, nullptr, c.disposition, 0,
-                             nullptr);
+      HANDLE h = CreateFileA(Win("f").c_str(), GENERIC_READ | GENERIC_WRITE, 0, nullptr,
+                             c.disposition, 0, nullptr);
       EXPECT_EQ(GetLastError(), code);
       EXPECT_EQ(h != INVALID_HANDLE_VALUE, opens);
       EXPECT_EQ(access(Posix("f").c_str(), F_OK) == 0, exists || opens);
@@ -317,14 +321,16 @@ TEST_F(CreateFileATest, RefusesBadArgumentsFoldersAndReadOnlyFiles) {
 TEST_F(CreateFileATest, WriteFileWritesFromTheStartAndRefusesBadHandles) {
   Put("f", "hello");
   HANDLE h = CreateFileA(Win("f").c_str(), GENERIC_WRITE, 0, nullptr, OPEN_EXISTING, 0, nullptr);
-  HANDLE readOnly = CreateFileA(Win("f").c_str(), GENERIC_READ, 0, nullptr, OPEN_EXISTING, 0, nullptr);
+  HANDLE readOnly =
+      CreateFileA(Win("f").c_str(), GENERIC_READ, 0, nullptr, OPEN_EXISTING, 0, nullptr);
   ASSERT_NE(readOnly, INVALID_HANDLE_VALUE);
   DWORD n = kSentinel;
   char overlapped[32] = {};
   EXPECT_CALL(WriteFile(h, "J", 1, &n, nullptr), TRUE, ERROR_SUCCESS);
   EXPECT_EQ(n, 1u);
   const std::string big(3 << 20, 'b');
-  EXPECT_CALL(WriteFile(h, big.data(), static_cast<DWORD>(big.size()), &n, nullptr), TRUE, ERROR_SUCCESS);
+  const DWORD size = static_cast<DWORD>(big.size());
+  EXPECT_CALL(WriteFile(h, big.data(), size, &n, nullptr), TRUE, ERROR_SUCCESS);
   EXPECT_EQ(n, big.size());
   EXPECT_CALL(WriteFile(h, "abc", 3, nullptr, nullptr), FALSE, ERROR_INVALID_PARAMETER);
   EXPECT_CALL(WriteFile(h, "abc", 3, &n, overlapped), FALSE, ERROR_INVALID_PARAMETER);

@@ -96,7 +96,8 @@ DWORD CopyFileImpl(LPCSTR existing, LPCSTR target, bool failIfExists) {
   struct stat dest;
   if (stat(to.c_str(), &dest) == 0) {
     if (failIfExists) return ERROR_FILE_EXISTS;
-    if (dest.st_dev == source.st_dev && dest.st_ino == source.st_ino) return ERROR_SHARING_VIOLATION;
+    const bool same = dest.st_dev == source.st_dev && dest.st_ino == source.st_ino;
+    if (same) return ERROR_SHARING_VIOLATION;
     if (S_ISDIR(dest.st_mode) || win32::IsReadOnlyMode(dest.st_mode)) return ERROR_ACCESS_DENIED;
   } else if (errno != ENOENT) {
     return win32::FileErrorFromErrno(errno, to);
@@ -139,7 +140,8 @@ BOOL Finish(DWORD err) {
 
 }  // namespace
 
-extern "C" BOOL WINAPI CopyFileA(LPCSTR lpExistingFileName, LPCSTR lpNewFileName, BOOL bFailIfExists) {
+extern "C" BOOL WINAPI CopyFileA(LPCSTR lpExistingFileName, LPCSTR lpNewFileName,
+                                 BOOL bFailIfExists) {
   try {
     return Finish(CopyFileImpl(lpExistingFileName, lpNewFileName, bFailIfExists != FALSE));
   } catch (const std::bad_alloc&) {

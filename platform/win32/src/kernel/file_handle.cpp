@@ -105,7 +105,8 @@ HANDLE CreateFileImpl(LPCSTR name, DWORD access, DWORD disposition, DWORD attrib
 
 }  // namespace
 
-extern "C" HANDLE WINAPI CreateFileA(LPCSTR lpFileName, DWORD dwDesiredAccess, DWORD /*dwShareMode*/,
+extern "C" HANDLE WINAPI CreateFileA(LPCSTR lpFileName, DWORD dwDesiredAccess,
+                                     DWORD /*dwShareMode*/,
                                      LPSECURITY_ATTRIBUTES /*lpSecurityAttributes*/,
                                      DWORD dwCreationDisposition, DWORD dwFlagsAndAttributes,
                                      HANDLE /*hTemplateFile*/) {

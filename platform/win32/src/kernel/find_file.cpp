@@ -6,6 +6,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <cstdint>
 #include <cstring>
 #include <memory>
 #include <mutex>
@@ -39,14 +40,14 @@ class DirCloser {
 };
 
 // Seconds between 1601-01-01 (the FILETIME epoch) and 1970-01-01.
-constexpr std::uint64_t kEpochDelta = 11644473600ull;
+constexpr std::int64_t kEpochDelta = 11644473600;
 
 FILETIME FileTimeFrom(const struct timespec& ts) {
   std::uint64_t ticks = 0;  // times before 1601 cannot be told and stay at zero
-  if (ts.tv_sec >= -static_cast<std::int64_t>(kEpochDelta)) {
-    ticks = (static_cast<std::uint64_t>(ts.tv_sec + static_cast<std::int64_t>(kEpochDelta))) * 10000000ull +
+  const std::int64_t seconds = static_cast<std::int64_t>(ts.tv_sec) + kEpochDelta;
+  if (seconds >= 0)
+    ticks = static_cast<std::uint64_t>(seconds) * 10000000u +
             static_cast<std::uint64_t>(ts.tv_nsec) / 100;
-  }
   FILETIME ft;
   ft.dwLowDateTime = static_cast<DWORD>(ticks & 0xFFFFFFFFu);
   ft.dwHighDateTime = static_cast<DWORD>(ticks >> 32);
@@ -77,7 +78,8 @@ WIN32_FIND_DATAA FindDataFrom(const char* name, std::size_t length, const struct
 DWORD ReadFolder(const std::string& folder, const std::string& pattern, FindState* state) {
   DIR* dir = opendir(folder.c_str());
   if (dir == nullptr)
-    return errno == ENOENT || errno == ENOTDIR ? ERROR_PATH_NOT_FOUND : win32::ErrorFromErrno(errno);
+    return errno == ENOENT || errno == ENOTDIR ? ERROR_PATH_NOT_FOUND
+                                               : win32::ErrorFromErrno(errno);
   DirCloser closer(dir);
   for (;;) {
     errno = 0;
