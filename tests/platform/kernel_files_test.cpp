@@ -1,0 +1,347 @@
+// Conformance of the kernel file calls (CopyFileA, DeleteFileA, the FindFile family,
+// CreateFileA/WriteFile/CloseHandle), each test in a fresh temporary folder.
+#include <dirent.h>
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <signal.h>
+#include <sys/resource.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cstdlib>
+#include <cstring>
+#include <fstream>
+#include <map>
+#include <set>
+#include <sstream>
+#include <string>
+
+#include "win32_paths.h"
+#include "windows.h"
+
+namespace {
+
+constexpr DWORD kSentinel = 0xDEADBEEF;
+constexpr time_t kY2k = 946684800;  // 2000-01-01 00:00 UTC, FILETIME 0x01BF53EB256D4000
+
+// Sets the sentinel, makes the call, checks its result and the last error it left.
+#define EXPECT_CALL(call, result, code)                                  \
+  do {                                                                   \
+    SetLastError(kSentinel);                                             \
+    EXPECT_EQ((call), (result)) << #call;                                \
+    EXPECT_EQ(GetLastError(), static_cast<DWORD>(code)) << #call;        \
+  } while (0)
+
+class FileTest : public ::testing::Test {
+ protected:
+  void SetUp() override {
+    char pattern[] = "/tmp/tw-files-XXXXXX";
+    ASSERT_NE(mkdtemp(pattern), nullptr);
+    root_ = pattern;
+    Put("ro", "read-only");
+    chmod(Posix("ro").c_str(), 0444);
+    mkdir(Posix("dir").c_str(), 0777);
+  }
+  void TearDown() override { std::system(("rm -rf '" + root_ + "'").c_str()); }
+
+  std::string Posix(const std::string& name) const { return root_ + "/" + name; }
+  std::string Win(const std::string& name) const {
+    return win32::WindowsPathFromPosix(Posix(name));
+  }
+  void Put(const std::string& name, const std::string& bytes) const {
+    std::ofstream(Posix(name), std::ios::binary) << bytes;
+  }
+  std::string Get(const std::string& name) const {
+    std::ostringstream bytes;
+    bytes << std::ifstream(Posix(name), std::ios::binary).rdbuf();
+    return bytes.str();
+  }
+  void SetTimes(const std::string& name) const {
+    const struct timespec times[2] = {{kY2k, 0}, {kY2k, 0}};
+    utimensat(AT_FDCWD, Posix(name).c_str(), times, 0);
+  }
+  std::set<std::string> Listing() const {
+    std::set<std::string> names;
+    DIR* dir = opendir(root_.c_str());
+    while (const dirent* e = readdir(dir))
+      if (std::strcmp(e->d_name, ".") != 0 && std::strcmp(e->d_name, "..") != 0)
+        names.insert(e->d_name);
+    closedir(dir);
+    return names;
+  }
+  // A Windows path of more than MAX_PATH characters inside the folder.
+  std::string TooLong() const { return Win(std::string(120, 'x') + "/" + std::string(200, 'y')); }
+
+  std::string root_;
+};
+
+using CopyFileATest = FileTest;
+using DeleteFileATest = FileTest;
+using CreateFileATest = FileTest;
+
+TEST_F(CopyFileATest, RefusesEachFailureWithItsCode) {
+  Put("src", "source");
+  Put("dst", "old");
+  const struct {
+    std::string from, to;
+    BOOL failIfExists;
+    DWORD code;
+  } cases[] = {
+      {Win("missing"), Win("new"), FALSE, ERROR_FILE_NOT_FOUND},
+      {Win("nofolder/src"), Win("new"), FALSE, ERROR_PATH_NOT_FOUND},
+      {Win("src"), Win("nofolder/new"), FALSE, ERROR_PATH_NOT_FOUND},
+      {Win("src"), Win("dst"), TRUE, ERROR_FILE_EXISTS},
+      {Win("src"), Win("src"), FALSE, ERROR_SHARING_VIOLATION},
+      {Win("dir"), Win("new"), FALSE, ERROR_ACCESS_DENIED},
+      {Win("src"), Win("ro"), FALSE, ERROR_ACCESS_DENIED},
+      {Win("src"), Win("dir"), FALSE, ERROR_ACCESS_DENIED},
+      {"C:\\src", Win("new"), FALSE, ERROR_PATH_NOT_FOUND},
+      {Win("src"), TooLong(), FALSE, ERROR_FILENAME_EXCED_RANGE},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.from + " -> " + c.to);
+    EXPECT_CALL(CopyFileA(c.from.c_str(), c.to.c_str(), c.failIfExists), FALSE, c.code);
+  }
+  EXPECT_CALL(CopyFileA(nullptr, Win("new").c_str(), FALSE), FALSE, ERROR_PATH_NOT_FOUND);
+  EXPECT_EQ(Get("dst"), "old");
+  EXPECT_EQ(Get("ro"), "read-only");
+  EXPECT_EQ(Listing(), (std::set<std::string>{"src", "dst", "ro", "dir"}));
+}
+
+TEST_F(CopyFileATest, CopiesContentTimeAndReadOnlyBitAndReplacesWhole) {
+  // Several reads long, and a multiple of no buffer size.
+  std::string big(3 * 65536 + 17, '\0');
+  for (std::size_t i = 0; i < big.size(); ++i) big[i] = static_cast<char>(i * 7 + i / 251);
+  Put("big", big);
+  SetTimes("big");
+  chmod(Posix("big").c_str(), 0444);
+  Put("dst", "an older and longer content");
+  EXPECT_CALL(CopyFileA(Win("big").c_str(), Win("copy").c_str(), TRUE), TRUE, ERROR_SUCCESS);
+  EXPECT_CALL(CopyFileA(Win("big").c_str(), Win("dst").c_str(), FALSE), TRUE, ERROR_SUCCESS);
+  for (const char* name : {"copy", "dst"}) {
+    EXPECT_EQ(Get(name), big) << name;
+    struct stat st;
+    ASSERT_EQ(stat(Posix(name).c_str(), &st), 0);
+    EXPECT_EQ(st.st_mtime, kY2k);
+    EXPECT_EQ(st.st_mode & S_IWUSR, 0u);
+  }
+  // No temporary file is left behind.
+  EXPECT_EQ(Listing(), (std::set<std::string>{"big", "copy", "dst", "ro", "dir"}));
+}
+
+// Copies with writes beyond 64 KiB failing, as on a full disk; exits 0 when the copy
+// fails with a code. Meant for a child process, where the limit stays.
+[[noreturn]] void CopyUnderFileSizeLimit(const std::string& from, const std::string& to) {
+  signal(SIGXFSZ, SIG_IGN);
+  struct rlimit limit;
+  limit.rlim_cur = limit.rlim_max = 65536;
+  setrlimit(RLIMIT_FSIZE, &limit);
+  SetLastError(kSentinel);
+  const BOOL ok = CopyFileA(from.c_str(), to.c_str(), FALSE);
+  _exit(!ok && GetLastError() != ERROR_SUCCESS && GetLastError() != kSentinel ? 0 : 1);
+}
+
+TEST_F(CopyFileATest, AFailedCopyLeavesTheDestinationAndNoTemporaryFile) {
+  Put("src", std::string(200000, 's'));
+  Put("dst", "intact");
+  EXPECT_EXIT(CopyUnderFileSizeLimit(Win("src"), Win("dst")), ::testing::ExitedWithCode(0), "");
+  EXPECT_EQ(Get("dst"), "intact");
+  EXPECT_EQ(Listing(), (std::set<std::string>{"src", "dst", "ro", "dir"}));
+}
+
+TEST_F(DeleteFileATest, DeletesFilesOnly) {
+  const struct {
+    std::string path;
+    DWORD code;
+  } cases[] = {
+      {Win("missing"), ERROR_FILE_NOT_FOUND}, {Win("nofolder/a"), ERROR_PATH_NOT_FOUND},
+      {Win("dir"), ERROR_ACCESS_DENIED},      {Win("ro"), ERROR_ACCESS_DENIED},
+      {"C:\\a.icc", ERROR_PATH_NOT_FOUND},     {"", ERROR_PATH_NOT_FOUND},
+      {TooLong(), ERROR_FILENAME_EXCED_RANGE},
+  };
+  for (const auto& c : cases) EXPECT_CALL(DeleteFileA(c.path.c_str()), FALSE, c.code);
+  EXPECT_EQ(Listing(), (std::set<std::string>{"ro", "dir"}));
+  Put("a.icc", "x");
+  EXPECT_CALL(DeleteFileA(Win("a.icc").c_str()), TRUE, ERROR_SUCCESS);
+  EXPECT_EQ(Listing(), (std::set<std::string>{"ro", "dir"}));
+}
+
+class FindFileTest : public FileTest {
+ protected:
+  void SetUp() override {
+    FileTest::SetUp();
+    const char* names[] = {"a.icc", "B.ICM", "h.iCc", "e.icx", "c.ic", ".icc",
+                           "x.y.icm", "d.ic.bak", "icc", "f.txt", "g", "x.pf"};
+    for (const char* name : names) Put(name, name);  // each file's size is its name's length
+  }
+  // Every entry a search returns, by name; checks that each comes once and that the
+  // search ends with ERROR_NO_MORE_FILES.
+  std::map<std::string, WIN32_FIND_DATAA> Search(const std::string& pattern) {
+    std::map<std::string, WIN32_FIND_DATAA> found;
+    WIN32_FIND_DATAA data;
+    SetLastError(kSentinel);
+    HANDLE find = FindFirstFileA(Win(pattern).c_str(), &data);
+    EXPECT_EQ(GetLastError(), ERROR_SUCCESS) << pattern;
+    if (find == INVALID_HANDLE_VALUE) return found;
+    do {
+      EXPECT_TRUE(found.emplace(data.cFileName, data).second) << "twice: " << data.cFileName;
+      SetLastError(kSentinel);
+    } while (FindNextFileA(find, &data));
+    EXPECT_EQ(GetLastError(), ERROR_NO_MORE_FILES);
+    EXPECT_TRUE(FindClose(find));
+    return found;
+  }
+  std::set<std::string> Names(const std::string& pattern) {
+    std::set<std::string> names;
+    for (const auto& entry : Search(pattern)) names.insert(entry.first);
+    return names;
+  }
+};
+
+TEST_F(FindFileTest, ReturnsEachMatchingNameOnce) {
+  EXPECT_EQ(Names("*.ic*"),
+            (std::set<std::string>{"a.icc", "B.ICM", "h.iCc", "e.icx", "c.ic", ".icc", "x.y.icm"}));
+  EXPECT_EQ(Names("*.*"), Listing());  // never "." or ".."
+}
+
+TEST_F(FindFileTest, FillsAttributesSizesAndTimes) {
+  SetTimes("B.ICM");
+  // A sparse file of 5 GiB + 3 bytes needs both size words.
+  ASSERT_EQ(truncate((Put("huge", ""), Posix("huge")).c_str(), (5ll << 30) + 3), 0);
+  auto found = Search("*");
+  EXPECT_EQ(found["ro"].dwFileAttributes, DWORD{FILE_ATTRIBUTE_READONLY});
+  EXPECT_EQ(found["dir"].dwFileAttributes, DWORD{FILE_ATTRIBUTE_DIRECTORY});
+  EXPECT_EQ(found["B.ICM"].dwFileAttributes, DWORD{FILE_ATTRIBUTE_NORMAL});
+  EXPECT_EQ(found["x.y.icm"].nFileSizeLow, 7u);
+  EXPECT_EQ(found["x.y.icm"].nFileSizeHigh, 0u);
+  EXPECT_EQ(found["huge"].nFileSizeHigh, 1u);
+  EXPECT_EQ(found["huge"].nFileSizeLow, (1u << 30) + 3);
+  EXPECT_EQ(found["B.ICM"].ftLastWriteTime.dwHighDateTime, 0x01BF53EBu);
+  EXPECT_EQ(found["B.ICM"].ftLastWriteTime.dwLowDateTime, 0x256D4000u);
+}
+
+TEST_F(FindFileTest, EnumeratesTheFolderAsItWasAtTheStart) {
+  WIN32_FIND_DATAA data;
+  HANDLE find = FindFirstFileA(Win("*.icm").c_str(), &data);
+  ASSERT_NE(find, INVALID_HANDLE_VALUE);
+  Put("late.icm", "x");
+  std::set<std::string> names = {data.cFileName};
+  while (FindNextFileA(find, &data)) names.insert(data.cFileName);
+  EXPECT_EQ(names, (std::set<std::string>{"B.ICM", "x.y.icm"}));
+  EXPECT_TRUE(FindClose(find));
+}
+
+TEST_F(FindFileTest, RefusesBadPatternsWithoutTouchingTheData) {
+  const struct {
+    std::string pattern;
+    DWORD code;
+  } cases[] = {
+      {Win("*.xyz"), ERROR_FILE_NOT_FOUND},        {Win("missing/*.icc"), ERROR_PATH_NOT_FOUND},
+      {Win("g/*"), ERROR_PATH_NOT_FOUND},          {Win("dir") + "\\", ERROR_FILE_NOT_FOUND},
+      {"C:\\windows\\*.icc", ERROR_PATH_NOT_FOUND}, {"*.icc", ERROR_PATH_NOT_FOUND},
+      {TooLong(), ERROR_FILENAME_EXCED_RANGE},
+  };
+  for (const auto& c : cases) {
+    WIN32_FIND_DATAA data;
+    std::memset(&data, 0xCC, sizeof data);
+    EXPECT_CALL(FindFirstFileA(c.pattern.c_str(), &data), INVALID_HANDLE_VALUE, c.code);
+    EXPECT_EQ(static_cast<unsigned char>(data.cFileName[0]), 0xCCu) << c.pattern;
+  }
+}
+
+TEST_F(FindFileTest, HandlesCloseOnceAndOnlyByFindClose) {
+  WIN32_FIND_DATAA data;
+  HANDLE find = FindFirstFileA(Win("*").c_str(), &data);
+  ASSERT_NE(find, INVALID_HANDLE_VALUE);
+  EXPECT_CALL(CloseHandle(find), FALSE, ERROR_INVALID_HANDLE);
+  EXPECT_CALL(FindNextFileA(find, nullptr), FALSE, ERROR_INVALID_PARAMETER);
+  EXPECT_CALL(FindNextFileA(find, &data), TRUE, ERROR_SUCCESS);  // still open
+  EXPECT_CALL(FindClose(find), TRUE, ERROR_SUCCESS);
+  for (HANDLE bad : {find, INVALID_HANDLE_VALUE}) {
+    EXPECT_CALL(FindClose(bad), FALSE, ERROR_INVALID_HANDLE);
+    EXPECT_CALL(FindNextFileA(bad, &data), FALSE, ERROR_INVALID_HANDLE);
+  }
+}
+
+TEST_F(CreateFileATest, EachDispositionOnAMissingAndAnExistingFile) {
+  const struct {
+    DWORD disposition;
+    DWORD onMissing, onExisting;  // the last error; the call fails unless it is 0 or 183
+    const char* contentAfter;     // of the existing file
+  } cases[] = {
+      {CREATE_NEW, ERROR_SUCCESS, ERROR_FILE_EXISTS, "hello"},
+      {CREATE_ALWAYS, ERROR_SUCCESS, ERROR_ALREADY_EXISTS, ""},
+      {OPEN_EXISTING, ERROR_FILE_NOT_FOUND, ERROR_SUCCESS, "hello"},
+      {OPEN_ALWAYS, ERROR_SUCCESS, ERROR_ALREADY_EXISTS, "hello"},
+      {TRUNCATE_EXISTING, ERROR_FILE_NOT_FOUND, ERROR_SUCCESS, ""},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.disposition);
+    for (bool exists : {false, true}) {
+      if (exists) Put("f", "hello");
+      const DWORD code = exists ? c.onExisting : c.onMissing;
+      const bool opens = code == ERROR_SUCCESS || code == ERROR_ALREADY_EXISTS;
+      SetLastError(kSentinel);
+      HANDLE h = CreateFileA(Win("f").c_str(), GENERIC_READ | GENERIC_WRITE, 0, nullptr,
+                             c.disposition, 0, nullptr);
+      EXPECT_EQ(GetLastError(), code);
+      EXPECT_EQ(h != INVALID_HANDLE_VALUE, opens);
+      EXPECT_EQ(access(Posix("f").c_str(), F_OK) == 0, exists || opens);
+      if (h != INVALID_HANDLE_VALUE) CloseHandle(h);
+    }
+    EXPECT_EQ(Get("f"), c.contentAfter);
+    unlink(Posix("f").c_str());
+  }
+}
+
+TEST_F(CreateFileATest, RefusesBadArgumentsFoldersAndReadOnlyFiles) {
+  const struct {
+    std::string path;
+    DWORD access, disposition, code;
+  } cases[] = {
+      {Win("f"), GENERIC_WRITE, 0, ERROR_INVALID_PARAMETER},
+      {Win("f"), GENERIC_WRITE, TRUNCATE_EXISTING + 1, ERROR_INVALID_PARAMETER},
+      {Win("ro"), GENERIC_READ, TRUNCATE_EXISTING, ERROR_INVALID_PARAMETER},
+      {Win("ro"), GENERIC_WRITE, OPEN_EXISTING, ERROR_ACCESS_DENIED},
+      {Win("ro"), GENERIC_WRITE, CREATE_ALWAYS, ERROR_ACCESS_DENIED},
+      {Win("dir"), GENERIC_WRITE, OPEN_ALWAYS, ERROR_ACCESS_DENIED},
+      {Win("nofolder/f"), GENERIC_WRITE, CREATE_ALWAYS, ERROR_PATH_NOT_FOUND},
+      {"C:\\f", GENERIC_WRITE, CREATE_ALWAYS, ERROR_PATH_NOT_FOUND},
+      {TooLong(), GENERIC_WRITE, CREATE_ALWAYS, ERROR_FILENAME_EXCED_RANGE},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.path + " " + std::to_string(c.disposition));
+    EXPECT_CALL(CreateFileA(c.path.c_str(), c.access, 0, nullptr, c.disposition, 0, nullptr),
+                INVALID_HANDLE_VALUE, c.code);
+  }
+  EXPECT_EQ(Get("ro"), "read-only");
+  EXPECT_EQ(Listing(), (std::set<std::string>{"ro", "dir"}));
+}
+
+TEST_F(CreateFileATest, WriteFileWritesFromTheStartAndRefusesBadHandles) {
+  Put("f", "hello");
+  HANDLE h = CreateFileA(Win("f").c_str(), GENERIC_WRITE, 0, nullptr, OPEN_EXISTING, 0, nullptr);
+  HANDLE readOnly =
+      CreateFileA(Win("f").c_str(), GENERIC_READ, 0, nullptr, OPEN_EXISTING, 0, nullptr);
+  ASSERT_NE(readOnly, INVALID_HANDLE_VALUE);
+  DWORD n = kSentinel;
+  char overlapped[32] = {};
+  EXPECT_CALL(WriteFile(h, "J", 1, &n, nullptr), TRUE, ERROR_SUCCESS);
+  EXPECT_EQ(n, 1u);
+  const std::string big(3 << 20, 'b');
+  const DWORD size = static_cast<DWORD>(big.size());
+  EXPECT_CALL(WriteFile(h, big.data(), size, &n, nullptr), TRUE, ERROR_SUCCESS);
+  EXPECT_EQ(n, big.size());
+  EXPECT_CALL(WriteFile(h, "abc", 3, nullptr, nullptr), FALSE, ERROR_INVALID_PARAMETER);
+  EXPECT_CALL(WriteFile(h, "abc", 3, &n, overlapped), FALSE, ERROR_INVALID_PARAMETER);
+  EXPECT_CALL(WriteFile(readOnly, "abc", 3, &n, nullptr), FALSE, ERROR_ACCESS_DENIED);
+  EXPECT_CALL(CloseHandle(readOnly), TRUE, ERROR_SUCCESS);
+  EXPECT_CALL(CloseHandle(h), TRUE, ERROR_SUCCESS);
+  for (HANDLE bad : {h, INVALID_HANDLE_VALUE, HANDLE{nullptr}}) {
+    EXPECT_CALL(WriteFile(bad, "abc", 3, &n, nullptr), FALSE, ERROR_INVALID_HANDLE);
+    EXPECT_CALL(CloseHandle(bad), FALSE, ERROR_INVALID_HANDLE);
+  }
+  EXPECT_EQ(Get("f"), "J" + big);
+}
+
+}  // namespace
