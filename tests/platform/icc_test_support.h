@@ -85,6 +85,24 @@ inline Bytes MakeProfile(const std::vector<TagEntry>& entries, std::size_t dataB
   return b;
 }
 
+// A well-formed profile of the given class and data space whose tags are laid out one
+// after another, 4-byte aligned, each tagSize bytes long and starting with a non-zero
+// type signature.
+inline Bytes MakeTagged(std::uint32_t cls, std::uint32_t space, const std::vector<std::uint32_t>& sigs,
+                        std::uint32_t tagSize = 16) {
+  std::vector<TagEntry> entries;
+  std::uint32_t at = static_cast<std::uint32_t>(132 + 12 * sigs.size());
+  for (std::uint32_t sig : sigs) {
+    entries.push_back({sig, at, tagSize});
+    at += (tagSize + 3) & ~3u;
+  }
+  Bytes b = MakeProfile(entries, at - (132 + 12 * sigs.size()));
+  PutBE32(b, 12, cls);
+  PutBE32(b, 16, space);
+  for (const TagEntry& e : entries) PutBE32(b, e.offset, Sig("curv"));
+  return b;
+}
+
 inline HPROFILE OpenMemory(const Bytes& bytes, DWORD access = PROFILE_READWRITE) {
   PROFILE p{PROFILE_MEMBUFFER, const_cast<std::uint8_t*>(bytes.data()), static_cast<DWORD>(bytes.size())};
   return OpenColorProfileA(&p, access, 0, OPEN_EXISTING);
