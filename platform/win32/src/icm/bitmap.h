@@ -1,0 +1,18 @@
+// TranslateBitmapBits internals that tests and benchmarks reach.
+#ifndef TINTWELL_WIN32_ICM_BITMAP_H
+#define TINTWELL_WIN32_ICM_BITMAP_H
+
+#include <cstddef>
+
+namespace win32::icm {
+
+// Images of at least this many pixels are shared between worker threads.
+constexpr size_t kBitmapThreadingPixels = size_t{1} << 18;
+
+// Caps the worker threads TranslateBitmapBits uses (0 = one per core, the default).
+// For tests and benchmarks that compare the single- and multi-threaded paths.
+void SetBitmapThreadLimit(unsigned limit);
+
+}  // namespace win32::icm
+
+#endif

@@ -1,0 +1,54 @@
+// Whether a Lab colour lies inside a profile's device gamut.
+//
+// RGB matrix-shaper profiles are tested exactly: Lab -> XYZ (D50) -> linear RGB by the
+// inverse of the colorant matrix; inside when every channel is within [0, 1] give or
+// take kMatrixEpsilon (which absorbs the s15.16 rounding of the colorants and the Lab
+// word steps, so the white point itself counts as inside).
+// Every other device profile is tested by a round trip in double precision,
+// Lab -> device -> Lab with relative colorimetric tables both ways: inside when the
+// device values are within [0, 1] and the colour comes back within kRoundTripDeltaE.
+// The result is 0 inside, otherwise the CIE76 distance to the colour that comes back
+// (the clipped colour for matrix-shapers), rounded, at least 1 and at most 255.
+#ifndef TINTWELL_WIN32_ICM_GAMUT_H
+#define TINTWELL_WIN32_ICM_GAMUT_H
+
+#include <lcms2.h>
+
+#include <memory>
+
+#include "icm.h"
+
+namespace win32::icm {
+
+class GamutCheck {
+ public:
+  static constexpr double kMatrixEpsilon = 2e-4;
+  static constexpr double kRoundTripDeltaE = 3.0;
+
+  // Makes the check for a profile of the given context. A profile without a device
+  // gamut (abstract, named, or with a Lab or XYZ data space) gives null: everything
+  // is inside. A device link has no gamut in the PCS: ERROR_NOT_SUPPORTED.
+  static DWORD Create(cmsContext context, cmsHPROFILE profile, std::unique_ptr<GamutCheck>& check);
+
+  ~GamutCheck();
+  GamutCheck(const GamutCheck&) = delete;
+  GamutCheck& operator=(const GamutCheck&) = delete;
+
+  BYTE Check(const cmsCIELab& lab) const;
+
+ private:
+  GamutCheck() = default;
+  BYTE CheckMatrix(const cmsCIELab& lab) const;
+  BYTE CheckRoundTrip(const cmsCIELab& lab) const;
+
+  bool matrix_ = false;
+  double to_rgb_[3][3] = {};    // XYZ -> linear RGB
+  double from_rgb_[3][3] = {};  // linear RGB -> XYZ
+  cmsHTRANSFORM to_device_ = nullptr;
+  cmsHTRANSFORM to_lab_ = nullptr;
+  int channels_ = 0;
+};
+
+}  // namespace win32::icm
+
+#endif

@@ -1,0 +1,181 @@
+#include "icm/icc_container.h"
+
+#include <cstring>
+#include <limits>
+#include <new>
+#include <unordered_set>
+
+namespace win32::icm {
+
+namespace {
+
+constexpr std::uint64_t kMaxFileSize = std::numeric_limits<std::uint32_t>::max();
+
+std::uint64_t AlignUp4(std::uint64_t n) { return (n + 3) & ~std::uint64_t{3}; }
+
+}  // namespace
+
+std::uint32_t ReadBE32(const std::uint8_t* p) {
+  return (std::uint32_t{p[0]} << 24) | (std::uint32_t{p[1]} << 16) | (std::uint32_t{p[2]} << 8) |
+         std::uint32_t{p[3]};
+}
+
+void WriteBE32(std::uint8_t* p, std::uint32_t value) {
+  p[0] = static_cast<std::uint8_t>(value >> 24);
+  p[1] = static_cast<std::uint8_t>(value >> 16);
+  p[2] = static_cast<std::uint8_t>(value >> 8);
+  p[3] = static_cast<std::uint8_t>(value);
+}
+
+DWORD IccContainer::Parse(const std::uint8_t* data, std::size_t size, IccContainer& out) {
+  if (data == nullptr || size < kMinProfileSize || size > kMaxFileSize) return ERROR_INVALID_PROFILE;
+  if (ReadBE32(data + kOffsetSignature) != kSignatureAcsp) return ERROR_INVALID_PROFILE;
+
+  // Bytes after a smaller declared size are not part of the profile; a larger declared
+  // size (a truncated file) is left for the validity check to report.
+  std::uint64_t extent = size;
+  const std::uint32_t declared = ReadBE32(data + kOffsetSize);
+  if (declared >= kMinProfileSize && declared < extent) extent = declared;
+
+  const std::uint64_t count = ReadBE32(data + kHeaderSize);
+  if (count > (extent - kMinProfileSize) / kTagEntrySize) return ERROR_INVALID_PROFILE;
+
+  // Check the whole table before copying anything.
+  std::unordered_set<std::uint32_t> seen;
+  seen.reserve(static_cast<std::size_t>(count));
+  const std::uint8_t* table = data + kMinProfileSize;
+  for (std::uint64_t i = 0; i < count; ++i) {
+    const std::uint8_t* entry = table + i * kTagEntrySize;
+    const std::uint64_t offset = ReadBE32(entry + 4);
+    const std::uint64_t length = ReadBE32(entry + 8);
+    if (offset > extent || length > extent - offset) return ERROR_INVALID_PROFILE;
+    // Two entries for one tag leave no way to tell which one a caller means.
+    if (!seen.insert(ReadBE32(entry)).second) return ERROR_INVALID_PROFILE;
+  }
+
+  IccContainer result;
+  std::memcpy(result.header_.data(), data, kHeaderSize);
+  result.byte_size_ = extent;
+  result.tags_.reserve(static_cast<std::size_t>(count));
+  std::unordered_map<std::uint64_t, std::shared_ptr<Block>> blocks;  // (offset, size) -> data
+  for (std::uint64_t i = 0; i < count; ++i) {
+    const std::uint8_t* entry = table + i * kTagEntrySize;
+    const std::uint32_t offset = ReadBE32(entry + 4);
+    const std::uint32_t length = ReadBE32(entry + 8);
+    std::shared_ptr<Block>& block = blocks[(std::uint64_t{offset} << 32) | length];
+    if (!block) block = std::make_shared<Block>(data + offset, data + offset + length);
+    result.tags_.push_back(Tag{ReadBE32(entry), block});
+  }
+  result.RebuildIndex();
+  out = std::move(result);
+  return ERROR_SUCCESS;
+}
+
+IccContainer IccContainer::Blank() {
+  IccContainer blank;
+  WriteBE32(blank.header_.data() + kOffsetSize, static_cast<std::uint32_t>(kMinProfileSize));
+  WriteBE32(blank.header_.data() + kOffsetVersion, 0x02100000);
+  WriteBE32(blank.header_.data() + kOffsetSignature, kSignatureAcsp);
+  WriteBE32(blank.header_.data() + kOffsetIlluminant, 0x0000F6D6);
+  WriteBE32(blank.header_.data() + kOffsetIlluminant + 4, 0x00010000);
+  WriteBE32(blank.header_.data() + kOffsetIlluminant + 8, 0x0000D32D);
+  return blank;
+}
+
+void IccContainer::SetHeader(const std::uint8_t* bytes) {
+  std::memcpy(header_.data(), bytes, kHeaderSize);
+}
+
+const IccContainer::Block* IccContainer::Element(std::uint32_t signature) const {
+  auto it = index_.find(signature);
+  return it == index_.end() ? nullptr : tags_[it->second].data.get();
+}
+
+bool IccContainer::IsShared(std::uint32_t signature) const {
+  auto it = index_.find(signature);
+  return it != index_.end() && tags_[it->second].data.use_count() > 1;
+}
+
+IccContainer::Block& IccContainer::OwnBlock(std::size_t index) {
+  std::shared_ptr<Block>& data = tags_[index].data;
+  if (data.use_count() > 1) data = std::make_shared<Block>(*data);
+  return *data;
+}
+
+std::size_t IccContainer::WriteElement(std::uint32_t signature, std::size_t offset, const void* data,
+                                       std::size_t count) {
+  auto it = index_.find(signature);
+  if (it == index_.end()) return 0;
+  const Block& current = *tags_[it->second].data;
+  if (offset >= current.size() || count == 0) return 0;
+  const std::size_t n = count < current.size() - offset ? count : current.size() - offset;
+  Block& block = OwnBlock(it->second);
+  std::memcpy(block.data() + offset, data, n);
+  return n;
+}
+
+DWORD IccContainer::ResizeElement(std::uint32_t signature, std::size_t size) {
+  auto it = index_.find(signature);
+  if (size == 0) {
+    if (it == index_.end()) return ERROR_TAG_NOT_FOUND;
+    tags_.erase(tags_.begin() + static_cast<std::ptrdiff_t>(it->second));
+    RebuildIndex();
+  } else {
+    // The file must stay addressable with 32-bit offsets and sizes.
+    const std::uint64_t old = it == index_.end() ? 0 : tags_[it->second].data->size();
+    if (size > kMaxFileSize || SerializedSize() + kTagEntrySize + AlignUp4(size) - old > kMaxFileSize)
+      return ERROR_NOT_ENOUGH_MEMORY;
+    if (it == index_.end()) {
+      tags_.push_back(Tag{signature, std::make_shared<Block>(size)});
+      index_[signature] = tags_.size() - 1;
+    } else {
+      OwnBlock(it->second).resize(size);
+    }
+  }
+  byte_size_ = SerializedSize();
+  WriteBE32(header_.data() + kOffsetSize, static_cast<std::uint32_t>(byte_size_));
+  return ERROR_SUCCESS;
+}
+
+void IccContainer::RebuildIndex() {
+  index_.clear();
+  index_.reserve(tags_.size());
+  for (std::size_t i = 0; i < tags_.size(); ++i) index_.emplace(tags_[i].signature, i);
+}
+
+std::uint64_t IccContainer::SerializedSize() const {
+  std::uint64_t total = kMinProfileSize + tags_.size() * kTagEntrySize;
+  std::unordered_set<const Block*> placed;
+  for (const Tag& tag : tags_)
+    if (placed.insert(tag.data.get()).second) total = AlignUp4(total) + tag.data->size();
+  return AlignUp4(total);
+}
+
+std::vector<std::uint8_t> IccContainer::Serialize() const {
+  const std::uint64_t total = SerializedSize();
+  if (total > kMaxFileSize) throw std::bad_alloc();
+  std::vector<std::uint8_t> out(header_.begin(), header_.end());
+  out.resize(static_cast<std::size_t>(total), 0);
+  WriteBE32(out.data() + kOffsetSize, static_cast<std::uint32_t>(total));
+  WriteBE32(out.data() + kHeaderSize, static_cast<std::uint32_t>(tags_.size()));
+
+  std::unordered_map<const Block*, std::uint32_t> offsets;
+  std::uint64_t next = kMinProfileSize + tags_.size() * kTagEntrySize;
+  std::uint8_t* entry = out.data() + kMinProfileSize;
+  for (const Tag& tag : tags_) {
+    auto placed = offsets.emplace(tag.data.get(), 0);
+    if (placed.second) {
+      next = AlignUp4(next);
+      placed.first->second = static_cast<std::uint32_t>(next);
+      if (!tag.data->empty()) std::memcpy(out.data() + next, tag.data->data(), tag.data->size());
+      next += tag.data->size();
+    }
+    WriteBE32(entry, tag.signature);
+    WriteBE32(entry + 4, placed.first->second);
+    WriteBE32(entry + 8, static_cast<std::uint32_t>(tag.data->size()));
+    entry += kTagEntrySize;
+  }
+  return out;
+}
+
+}  // namespace win32::icm

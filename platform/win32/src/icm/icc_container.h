@@ -1,0 +1,95 @@
+// An ICC profile held in memory: the 128-byte header, the tag table in file order and
+// the tag data. Entries that shared one data block in the file keep sharing it until
+// one of them is resized or rewritten. Reads and writes work on the stored bytes in
+// place; the file layout is rebuilt only when the profile is serialised.
+#ifndef TINTWELL_WIN32_ICM_ICC_CONTAINER_H
+#define TINTWELL_WIN32_ICM_ICC_CONTAINER_H
+
+#include <array>
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+#include <unordered_map>
+#include <vector>
+
+#include "windows.h"
+
+namespace win32::icm {
+
+constexpr std::size_t kHeaderSize = 128;
+constexpr std::size_t kTagEntrySize = 12;
+constexpr std::size_t kMinProfileSize = kHeaderSize + 4;  // header and tag count
+constexpr std::uint32_t kSignatureAcsp = 0x61637370;       // 'acsp'
+constexpr std::size_t kOffsetSize = 0;
+constexpr std::size_t kOffsetVersion = 8;
+constexpr std::size_t kOffsetClass = 12;
+constexpr std::size_t kOffsetDataSpace = 16;
+constexpr std::size_t kOffsetSignature = 36;
+constexpr std::size_t kOffsetIlluminant = 68;
+
+std::uint32_t ReadBE32(const std::uint8_t* p);
+void WriteBE32(std::uint8_t* p, std::uint32_t value);
+
+class IccContainer {
+ public:
+  using Block = std::vector<std::uint8_t>;
+
+  // Parses a profile. Returns ERROR_SUCCESS, or ERROR_INVALID_PROFILE when the bytes
+  // are not a well-formed ICC container (the whole tag table is checked before any
+  // tag data is copied). May throw std::bad_alloc.
+  static DWORD Parse(const std::uint8_t* data, std::size_t size, IccContainer& out);
+
+  // A profile with a header ('acsp', version 2.1, D50 illuminant) and no tags.
+  static IccContainer Blank();
+
+  const std::array<std::uint8_t, kHeaderSize>& Header() const { return header_; }
+  // Stores the 128 header bytes as given.
+  void SetHeader(const std::uint8_t* bytes);
+
+  // Byte count of the profile as it stands: the parsed extent until the layout
+  // changes, the serialised size afterwards.
+  std::uint64_t ByteSize() const { return byte_size_; }
+
+  std::size_t TagCount() const { return tags_.size(); }
+  std::uint32_t TagAt(std::size_t index) const { return tags_[index].signature; }
+  bool HasTag(std::uint32_t signature) const { return index_.count(signature) != 0; }
+
+  // The element's bytes, or null when the tag is absent.
+  const Block* Element(std::uint32_t signature) const;
+  // True when another entry shares the element's data.
+  bool IsShared(std::uint32_t signature) const;
+
+  // Copies bytes into an existing element at offset, never past its end. The caller
+  // has checked offset <= size. Returns the number of bytes written.
+  std::size_t WriteElement(std::uint32_t signature, std::size_t offset, const void* data,
+                           std::size_t count);
+
+  // Creates (zero-filled), resizes (truncate or zero-extend) or, with size 0, removes
+  // an element. A shared element first gets its own copy. Returns ERROR_SUCCESS,
+  // ERROR_TAG_NOT_FOUND (removing an absent tag) or ERROR_NOT_ENOUGH_MEMORY (the file
+  // would outgrow 32-bit sizes). The size field follows the new layout.
+  DWORD ResizeElement(std::uint32_t signature, std::size_t size);
+
+  // The complete file: tag table in order, each distinct data block once, 4-byte
+  // aligned with zero padding, size field set to the total.
+  std::vector<std::uint8_t> Serialize() const;
+
+ private:
+  struct Tag {
+    std::uint32_t signature;
+    std::shared_ptr<Block> data;  // only tag entries hold these pointers
+  };
+
+  Block& OwnBlock(std::size_t index);
+  void RebuildIndex();
+  std::uint64_t SerializedSize() const;
+
+  std::array<std::uint8_t, kHeaderSize> header_{};
+  std::vector<Tag> tags_;
+  std::unordered_map<std::uint32_t, std::size_t> index_;
+  std::uint64_t byte_size_ = kMinProfileSize;
+};
+
+}  // namespace win32::icm
+
+#endif

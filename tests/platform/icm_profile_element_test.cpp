@@ -1,0 +1,312 @@
+// Conformance of the element calls: reads at every boundary, writes, size changes,
+// shared data, and the tag-table queries.
+#include <cstring>
+
+#include "icc_test_support.h"
+#include "icm/profile_store.h"
+
+namespace {
+
+using namespace icctest;
+
+// Table end is 132 + 3 * 12 = 168. wtpt holds file bytes 168..187; rTRC and gTRC share
+// 188..201. MakeProfile fills byte i of the file with i & 0xFF.
+const std::vector<TagEntry> kTable = {
+    {Sig("wtpt"), 168, 20}, {Sig("rTRC"), 188, 14}, {Sig("gTRC"), 188, 14}};
+Bytes SampleProfile() { return MakeProfile(kTable, 36); }
+Bytes FileBytes(std::uint32_t from, std::uint32_t count) {
+  Bytes b(count);
+  for (std::uint32_t i = 0; i < count; ++i) b[i] = static_cast<std::uint8_t>(from + i);
+  return b;
+}
+
+TEST(GetColorProfileElement, Boundaries) {
+  HPROFILE h = OpenMemory(SampleProfile(), PROFILE_READ);
+  ASSERT_NE(h, nullptr);
+  constexpr DWORD kUntouched = 0xCAFE;
+  struct Case {
+    const char* what;
+    TAGTYPE tag;
+    DWORD offset;
+    DWORD pcb;
+    bool withBuffer;
+    BOOL result;
+    DWORD error;
+    DWORD pcbAfter;
+    std::uint32_t firstFileByte;  // where the copied bytes come from
+    BOOL reference;
+  } cases[] = {
+      {"size query", Sig("wtpt"), 0, 0, false, FALSE, ERROR_INSUFFICIENT_BUFFER, 20, 0, kUntouched},
+      {"size query ignores offset", Sig("wtpt"), 7, 3, false, FALSE, ERROR_INSUFFICIENT_BUFFER, 20, 0, kUntouched},
+      {"exact", Sig("wtpt"), 0, 20, true, TRUE, ERROR_SUCCESS, 20, 168, FALSE},
+      {"larger buffer", Sig("wtpt"), 0, 64, true, TRUE, ERROR_SUCCESS, 20, 168, FALSE},
+      {"smaller buffer", Sig("wtpt"), 0, 4, true, TRUE, ERROR_SUCCESS, 4, 168, FALSE},
+      {"field at an offset", Sig("wtpt"), 8, 4, true, TRUE, ERROR_SUCCESS, 4, 176, FALSE},
+      {"remainder shorter than buffer", Sig("wtpt"), 16, 64, true, TRUE, ERROR_SUCCESS, 4, 184, FALSE},
+      {"offset = size", Sig("wtpt"), 20, 64, true, TRUE, ERROR_SUCCESS, 0, 0, FALSE},
+      {"offset > size", Sig("wtpt"), 21, 64, true, FALSE, ERROR_INVALID_PARAMETER, 64, 0, kUntouched},
+      {"absent tag", Sig("cprt"), 0, 64, true, FALSE, ERROR_TAG_NOT_FOUND, 64, 0, kUntouched},
+      {"tag 0", 0, 0, 64, true, FALSE, ERROR_TAG_NOT_FOUND, 64, 0, kUntouched},
+      {"shared data", Sig("gTRC"), 0, 64, true, TRUE, ERROR_SUCCESS, 14, 188, TRUE},
+      {"shared data, other entry", Sig("rTRC"), 2, 5, true, TRUE, ERROR_SUCCESS, 5, 190, TRUE},
+  };
+  for (const Case& c : cases) {
+    SCOPED_TRACE(c.what);
+    std::uint8_t buffer[64];
+    std::memset(buffer, 0xEE, sizeof buffer);
+    DWORD pcb = c.pcb;
+    BOOL reference = kUntouched;
+    SetLastError(kSentinel);
+    EXPECT_EQ(GetColorProfileElement(h, c.tag, c.offset, &pcb, c.withBuffer ? buffer : nullptr, &reference),
+              c.result);
+    EXPECT_EQ(GetLastError(), c.error);
+    EXPECT_EQ(pcb, c.pcbAfter);
+    EXPECT_EQ(reference, c.reference);
+    const std::size_t copied = c.result ? c.pcbAfter : 0;
+    EXPECT_EQ(Bytes(buffer, buffer + copied), FileBytes(c.firstFileByte, static_cast<std::uint32_t>(copied)));
+    for (std::size_t i = copied; i < sizeof buffer; ++i) ASSERT_EQ(buffer[i], 0xEE) << "wrote past " << copied;
+  }
+
+  DWORD pcb = 8;
+  std::uint8_t buffer[8];
+  SetLastError(kSentinel);
+  EXPECT_FALSE(GetColorProfileElement(h, Sig("wtpt"), 0, nullptr, buffer, nullptr));
+  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
+  SetLastError(kSentinel);
+  EXPECT_TRUE(GetColorProfileElement(h, Sig("wtpt"), 0, &pcb, buffer, nullptr));  // reference is optional
+  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+  EXPECT_TRUE(CloseColorProfile(h));
+}
+
+TEST(ColorProfileTags, IndexAndPresence) {
+  HPROFILE h = OpenMemory(SampleProfile(), PROFILE_READ);
+  ASSERT_NE(h, nullptr);
+  SetLastError(kSentinel);
+  EXPECT_FALSE(GetCountColorProfileElements(h, nullptr));
+  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
+
+  for (DWORD bad : {0u, 4u, 0xFFFFFFFFu}) {
+    TAGTYPE tag = 0x1234;
+    SetLastError(kSentinel);
+    EXPECT_FALSE(GetColorProfileElementTag(h, bad, &tag));
+    EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
+    EXPECT_EQ(tag, 0x1234u) << "left untouched";
+  }
+  SetLastError(kSentinel);
+  EXPECT_FALSE(GetColorProfileElementTag(h, 1, nullptr));
+  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
+  TAGTYPE last = 0;
+  EXPECT_TRUE(GetColorProfileElementTag(h, 3, &last));
+  EXPECT_EQ(last, Sig("gTRC"));
+
+  struct {
+    TAGTYPE tag;
+    BOOL present;
+  } presence[] = {{Sig("wtpt"), TRUE}, {Sig("gTRC"), TRUE}, {Sig("cprt"), FALSE}, {0, FALSE}};
+  for (const auto& p : presence) {
+    BOOL present = 7;
+    SetLastError(kSentinel);
+    EXPECT_TRUE(IsColorProfileTagPresent(h, p.tag, &present));
+    EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+    EXPECT_EQ(present, p.present) << std::hex << p.tag;
+  }
+  SetLastError(kSentinel);
+  EXPECT_FALSE(IsColorProfileTagPresent(h, Sig("wtpt"), nullptr));
+  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
+  EXPECT_TRUE(CloseColorProfile(h));
+}
+
+TEST(SetColorProfileElement, WritesInsideTheElementOnly) {
+  HPROFILE h = OpenMemory(SampleProfile());
+  ASSERT_NE(h, nullptr);
+  std::uint8_t data[64];
+  for (int i = 0; i < 64; ++i) data[i] = static_cast<std::uint8_t>(0x80 + i);
+  struct Case {
+    const char* what;
+    TAGTYPE tag;
+    DWORD offset, pcb;
+    BOOL result;
+    DWORD error, pcbAfter;
+  } cases[] = {
+      {"inside", Sig("wtpt"), 2, 4, TRUE, ERROR_SUCCESS, 4},
+      {"clipped at the end", Sig("wtpt"), 12, 64, TRUE, ERROR_SUCCESS, 8},
+      {"offset = size", Sig("wtpt"), 20, 64, TRUE, ERROR_SUCCESS, 0},
+      {"offset > size", Sig("wtpt"), 21, 4, FALSE, ERROR_INVALID_PARAMETER, 4},
+      {"absent tag", Sig("cprt"), 0, 4, FALSE, ERROR_TAG_NOT_FOUND, 4},
+  };
+  for (const Case& c : cases) {
+    SCOPED_TRACE(c.what);
+    DWORD pcb = c.pcb;
+    SetLastError(kSentinel);
+    EXPECT_EQ(SetColorProfileElement(h, c.tag, c.offset, &pcb, data), c.result);
+    EXPECT_EQ(GetLastError(), c.error);
+    EXPECT_EQ(pcb, c.pcbAfter);
+  }
+  // wtpt: bytes 0-1 original, 2-5 = data[0..3], 6-11 original, 12-19 = data[0..7].
+  Bytes expected = FileBytes(168, 20);
+  std::memcpy(&expected[2], data, 4);
+  std::memcpy(&expected[12], data, 8);
+  Bytes got(64);
+  DWORD pcb = 64;
+  ASSERT_TRUE(GetColorProfileElement(h, Sig("wtpt"), 0, &pcb, got.data(), nullptr));
+  got.resize(pcb);
+  EXPECT_EQ(got, expected);
+
+  DWORD four = 4;
+  SetLastError(kSentinel);
+  EXPECT_FALSE(SetColorProfileElement(h, Sig("wtpt"), 0, nullptr, data));
+  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
+  SetLastError(kSentinel);
+  EXPECT_FALSE(SetColorProfileElement(h, Sig("wtpt"), 0, &four, nullptr));
+  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
+  EXPECT_TRUE(CloseColorProfile(h));
+}
+
+TEST(ElementWrites, ReadOnlyHandlesRefuseEveryChange) {
+  HPROFILE h = OpenMemory(SampleProfile(), PROFILE_READ);
+  ASSERT_NE(h, nullptr);
+  std::uint8_t data[4] = {1, 2, 3, 4};
+  DWORD pcb = 4;
+  SetLastError(kSentinel);
+  EXPECT_FALSE(SetColorProfileElement(h, Sig("wtpt"), 0, &pcb, data));
+  EXPECT_EQ(GetLastError(), ERROR_ACCESS_DENIED);
+  for (DWORD size : {0u, 8u, 40u}) {
+    SetLastError(kSentinel);
+    EXPECT_FALSE(SetColorProfileElementSize(h, Sig("wtpt"), size));
+    EXPECT_EQ(GetLastError(), ERROR_ACCESS_DENIED);
+  }
+  SetLastError(kSentinel);
+  EXPECT_FALSE(SetColorProfileElementSize(h, Sig("cprt"), 8));
+  EXPECT_EQ(GetLastError(), ERROR_ACCESS_DENIED);
+  DWORD size = 0;
+  GetColorProfileElement(h, Sig("wtpt"), 0, &size, nullptr, nullptr);
+  EXPECT_EQ(size, 20u);
+  EXPECT_TRUE(CloseColorProfile(h));
+}
+
+DWORD ElementSize(HPROFILE h, TAGTYPE tag) {
+  DWORD size = 0;
+  GetColorProfileElement(h, tag, 0, &size, nullptr, nullptr);
+  return size;
+}
+
+Bytes Element(HPROFILE h, TAGTYPE tag) {
+  Bytes b(ElementSize(h, tag));
+  DWORD n = static_cast<DWORD>(b.size());
+  EXPECT_TRUE(GetColorProfileElement(h, tag, 0, &n, b.data(), nullptr));
+  return b;
+}
+
+TEST(SetColorProfileElementSize, GrowShrinkRemoveCreate) {
+  HPROFILE h = OpenMemory(SampleProfile());
+  ASSERT_NE(h, nullptr);
+
+  SetLastError(kSentinel);
+  ASSERT_TRUE(SetColorProfileElementSize(h, Sig("wtpt"), 30));
+  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+  Bytes grown = FileBytes(168, 20);
+  grown.resize(30, 0);
+  EXPECT_EQ(Element(h, Sig("wtpt")), grown);
+
+  ASSERT_TRUE(SetColorProfileElementSize(h, Sig("wtpt"), 8));
+  EXPECT_EQ(Element(h, Sig("wtpt")), FileBytes(168, 8));
+
+  SetLastError(kSentinel);
+  ASSERT_TRUE(SetColorProfileElementSize(h, Sig("wtpt"), 0));
+  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+  DWORD count = 0;
+  ASSERT_TRUE(GetCountColorProfileElements(h, &count));
+  EXPECT_EQ(count, 2u);
+  BOOL present = TRUE;
+  ASSERT_TRUE(IsColorProfileTagPresent(h, Sig("wtpt"), &present));
+  EXPECT_FALSE(present);
+  TAGTYPE first = 0;
+  ASSERT_TRUE(GetColorProfileElementTag(h, 1, &first));
+  EXPECT_EQ(first, Sig("rTRC"));
+  SetLastError(kSentinel);
+  EXPECT_FALSE(SetColorProfileElementSize(h, Sig("wtpt"), 0));
+  EXPECT_EQ(GetLastError(), ERROR_TAG_NOT_FOUND);
+  SetLastError(kSentinel);
+  EXPECT_FALSE(SetColorProfileElementSize(h, 0, 8));
+  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
+
+  // Create, then fill: a new element is zero-filled and goes to the end of the table.
+  SetLastError(kSentinel);
+  ASSERT_TRUE(SetColorProfileElementSize(h, Sig("cprt"), 12));
+  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+  EXPECT_EQ(Element(h, Sig("cprt")), Bytes(12, 0));
+  ASSERT_TRUE(GetCountColorProfileElements(h, &count));
+  EXPECT_EQ(count, 3u);
+  TAGTYPE last = 0;
+  ASSERT_TRUE(GetColorProfileElementTag(h, 3, &last));
+  EXPECT_EQ(last, Sig("cprt"));
+  const Bytes text = {'t', 'e', 'x', 't', 0, 0, 0, 0, 'a', 'b', 'c', 0};
+  DWORD n = 12;
+  ASSERT_TRUE(SetColorProfileElement(h, Sig("cprt"), 0, &n, const_cast<std::uint8_t*>(text.data())));
+  EXPECT_EQ(Element(h, Sig("cprt")), text);
+  EXPECT_TRUE(CloseColorProfile(h));
+}
+
+TEST(SharedElements, ResizeOrRewriteGivesAnOwnCopy) {
+  for (bool resize : {true, false}) {
+    SCOPED_TRACE(resize ? "resize" : "rewrite");
+    HPROFILE h = OpenMemory(SampleProfile());
+    ASSERT_NE(h, nullptr);
+    if (resize) {
+      ASSERT_TRUE(SetColorProfileElementSize(h, Sig("gTRC"), 18));
+    } else {
+      std::uint8_t zero[2] = {0, 0};
+      DWORD n = 2;
+      ASSERT_TRUE(SetColorProfileElement(h, Sig("gTRC"), 0, &n, zero));
+    }
+    EXPECT_EQ(Element(h, Sig("rTRC")), FileBytes(188, 14)) << "the sibling stays intact";
+    Bytes changed = FileBytes(188, 14);
+    if (resize) changed.resize(18, 0); else changed[0] = changed[1] = 0;
+    EXPECT_EQ(Element(h, Sig("gTRC")), changed);
+    for (TAGTYPE tag : {Sig("rTRC"), Sig("gTRC")}) {
+      BOOL reference = TRUE;
+      DWORD n = 1;
+      std::uint8_t b;
+      ASSERT_TRUE(GetColorProfileElement(h, tag, 0, &n, &b, &reference));
+      EXPECT_FALSE(reference);
+    }
+    EXPECT_TRUE(CloseColorProfile(h));
+  }
+}
+
+// The saved layout: table in order, data 4-byte aligned, size field = byte count,
+// shared data written once, every element's bytes as the calls left them.
+TEST(SerializeProfile, LaysOutAlignedSharedData) {
+  Bytes source = MakeProfile({{Sig("wtpt"), 181, 19}, {Sig("rTRC"), 200, 13}, {Sig("gTRC"), 200, 13},
+                              {Sig("desc"), 213, 5}},
+                             40);  // unaligned on purpose
+  HPROFILE h = OpenMemory(source);
+  ASSERT_NE(h, nullptr);
+  ASSERT_TRUE(SetColorProfileElementSize(h, Sig("desc"), 7));
+  std::vector<std::uint8_t> saved;
+  ASSERT_TRUE(win32::icm::SerializeProfile(h, saved));
+  EXPECT_TRUE(CloseColorProfile(h));
+
+  ASSERT_GE(saved.size(), 132u);
+  EXPECT_EQ(BE32(saved, 0), saved.size());
+  EXPECT_EQ(saved.size() % 4, 0u);
+  const std::vector<TagEntry> table = TagTable(saved);
+  ASSERT_EQ(table.size(), 4u);
+  const TAGTYPE order[] = {Sig("wtpt"), Sig("rTRC"), Sig("gTRC"), Sig("desc")};
+  for (std::size_t i = 0; i < 4; ++i) {
+    EXPECT_EQ(table[i].signature, order[i]);
+    EXPECT_EQ(table[i].offset % 4, 0u) << i;
+    EXPECT_GE(table[i].offset, 132u + 48u);
+    ASSERT_LE(std::uint64_t{table[i].offset} + table[i].size, saved.size());
+  }
+  EXPECT_EQ(table[1].offset, table[2].offset) << "shared data stays shared";
+  EXPECT_EQ(TagBytes(saved, table[0]), FileBytes(181, 19));
+  EXPECT_EQ(TagBytes(saved, table[1]), FileBytes(200, 13));
+  Bytes desc = FileBytes(213, 5);
+  desc.resize(7, 0);
+  EXPECT_EQ(TagBytes(saved, table[3]), desc);
+  // Padding between blocks is zero.
+  EXPECT_EQ(saved[table[0].offset + 19], 0);
+}
+
+}  // namespace

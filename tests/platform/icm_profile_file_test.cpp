@@ -1,0 +1,393 @@
+// Profiles on disk: write-back at close, malformed input, validity of every real
+// profile, the colour directory and installing into it.
+#include <dirent.h>
+#include <lcms2.h>
+#include <sys/stat.h>
+
+#include <cstdio>
+#include <cstring>
+#include <functional>
+
+#include "icc_test_support.h"
+#include "icm/profile_store.h"
+
+namespace {
+
+using namespace icctest;
+
+class ProfileFiles : public TempFolderTest {};
+
+TEST_F(ProfileFiles, ChangesReachTheFileAtCloseOnly) {
+  const Bytes original = ReadBytes(IccPath("sRGB.icc"));
+  const std::string path = CopyOf("sRGB.icc", "edit.icc");
+  HPROFILE h = OpenPath(path, PROFILE_READWRITE, OPEN_EXISTING);
+  ASSERT_NE(h, nullptr);
+  const std::uint8_t mark[4] = {'M', 'A', 'R', 'K'};
+  DWORD n = 4;
+  ASSERT_TRUE(SetColorProfileElement(h, Sig("cprt"), 12, &n, const_cast<std::uint8_t*>(mark)));
+  ASSERT_TRUE(SetColorProfileElementSize(h, Sig("bkpt"), 20));  // a new tag
+  EXPECT_EQ(ReadBytes(Posix("edit.icc")), original) << "unchanged before close";
+  SetLastError(kSentinel);
+  ASSERT_TRUE(CloseColorProfile(h));
+  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+
+  // Re-parse independently: size field, alignment, order, untouched tags byte-exact.
+  const Bytes saved = ReadBytes(Posix("edit.icc"));
+  ASSERT_NE(saved, original);
+  EXPECT_EQ(BE32(saved, 0), saved.size());
+  const std::vector<TagEntry> before = TagTable(original), after = TagTable(saved);
+  ASSERT_EQ(after.size(), before.size() + 1);
+  EXPECT_EQ(after.back().signature, Sig("bkpt"));
+  EXPECT_EQ(TagBytes(saved, after.back()), Bytes(20, 0));
+  for (std::size_t i = 0; i < before.size(); ++i) {
+    SCOPED_TRACE(i);
+    EXPECT_EQ(after[i].signature, before[i].signature);
+    EXPECT_EQ(after[i].offset % 4, 0u);
+    Bytes expected = TagBytes(original, before[i]);
+    if (before[i].signature == Sig("cprt")) std::memcpy(&expected[12], mark, 4);
+    EXPECT_EQ(TagBytes(saved, after[i]), expected);
+  }
+  // The header is kept apart from the size field.
+  EXPECT_TRUE(std::equal(saved.begin() + 4, saved.begin() + 128, original.begin() + 4));
+  // No temporary file is left beside it.
+  int entries = 0;
+  DIR* dir = opendir(root_.c_str());
+  while (dirent* e = readdir(dir)) entries += e->d_name[0] != '.';
+  closedir(dir);
+  EXPECT_EQ(entries, 1);
+}
+
+TEST_F(ProfileFiles, ReadOnlyAndUnchangedHandlesNeverWrite) {
+  const Bytes original = ReadBytes(IccPath("Gray.icc"));
+  const std::string path = CopyOf("Gray.icc", "g.icc");
+  // Make the file read-only: a read handle must still open, a write handle must not.
+  ASSERT_EQ(chmod(Posix("g.icc").c_str(), 0444), 0);
+  if (access(Posix("g.icc").c_str(), W_OK) != 0) {  // not root
+    SetLastError(kSentinel);
+    EXPECT_EQ(OpenPath(path, PROFILE_READWRITE, OPEN_EXISTING), nullptr);
+    EXPECT_EQ(GetLastError(), ERROR_ACCESS_DENIED);
+  }
+  HPROFILE h = OpenPath(path, PROFILE_READ, OPEN_EXISTING);
+  ASSERT_NE(h, nullptr);
+  ASSERT_TRUE(CloseColorProfile(h));
+  ASSERT_EQ(chmod(Posix("g.icc").c_str(), 0644), 0);
+
+  struct stat before;
+  ASSERT_EQ(stat(Posix("g.icc").c_str(), &before), 0);
+  h = OpenPath(path, PROFILE_READWRITE, OPEN_EXISTING);
+  ASSERT_NE(h, nullptr);
+  DWORD count = 0;
+  ASSERT_TRUE(GetCountColorProfileElements(h, &count));
+  ASSERT_TRUE(CloseColorProfile(h));
+  struct stat after;
+  ASSERT_EQ(stat(Posix("g.icc").c_str(), &after), 0);
+  EXPECT_EQ(after.st_ino, before.st_ino) << "an unchanged profile is not rewritten";
+  EXPECT_EQ(ReadBytes(Posix("g.icc")), original);
+}
+
+TEST(MemoryProfiles, NeverTouchTheCallersBuffer) {
+  Bytes buffer = ReadBytes(IccPath("sRGB.icc"));
+  const Bytes copy = buffer;
+  HPROFILE h = OpenMemory(buffer);
+  ASSERT_NE(h, nullptr);
+  std::uint8_t zeros[8] = {};
+  DWORD n = 8;
+  ASSERT_TRUE(SetColorProfileElement(h, Sig("wtpt"), 0, &n, zeros));
+  ASSERT_TRUE(SetColorProfileElementSize(h, Sig("desc"), 0));
+  PROFILEHEADER header;
+  ASSERT_TRUE(GetColorProfileHeader(h, &header));
+  ASSERT_TRUE(SetColorProfileHeader(h, &header));
+  ASSERT_TRUE(CloseColorProfile(h));
+  EXPECT_EQ(buffer, copy);
+}
+
+// What this layer saves is read by Little CMS and by Argyll's iccdump.
+TEST_F(ProfileFiles, SavedProfilesOpenInOtherReaders) {
+  const std::string path = CopyOf("compatibleWithAdobeRGB1998.icc", "a98.icc");
+  HPROFILE h = OpenPath(path, PROFILE_READWRITE, OPEN_EXISTING);
+  ASSERT_NE(h, nullptr);
+  ASSERT_TRUE(SetColorProfileElementSize(h, Sig("bkpt"), 0));
+  ASSERT_TRUE(SetColorProfileElementSize(h, Sig("cprt"), 27));  // odd size: padding follows
+  ASSERT_TRUE(CloseColorProfile(h));
+
+  const Bytes saved = ReadBytes(Posix("a98.icc"));
+  cmsHPROFILE lcms = cmsOpenProfileFromMem(saved.data(), static_cast<cmsUInt32Number>(saved.size()));
+  ASSERT_NE(lcms, nullptr);
+  EXPECT_FALSE(cmsIsTag(lcms, cmsSigMediaBlackPointTag));
+  EXPECT_NE(cmsReadTag(lcms, cmsSigRedColorantTag), nullptr);
+  EXPECT_NE(cmsReadTag(lcms, cmsSigBlueTRCTag), nullptr);
+  cmsCloseProfile(lcms);
+
+  if (system("command -v iccdump >/dev/null 2>&1") != 0) GTEST_SKIP() << "iccdump is not installed";
+  const std::string command = "iccdump -v 3 '" + Posix("a98.icc") + "' >/dev/null 2>&1";
+  EXPECT_EQ(system(command.c_str()), 0);
+}
+
+TEST(MalformedProfiles, AreRefusedWithInvalidProfile) {
+  const Bytes srgb = ReadBytes(IccPath("sRGB.icc"));
+  auto withCount = [](std::uint32_t count) {
+    Bytes b = MakeProfile({{Sig("wtpt"), 144, 20}}, 20);
+    PutBE32(b, 128, count);
+    return b;
+  };
+  // Table end for one entry is 144; 20 data bytes make the file 164 bytes long.
+  struct Case {
+    const char* what;
+    Bytes bytes;
+  } cases[] = {
+      {"131 bytes", Bytes(srgb.begin(), srgb.begin() + 131)},
+      {"no acsp", [] { Bytes b = MakeProfile({}, 0); PutBE32(b, 36, Sig("acsq")); return b; }()},
+      {"tag count huge", withCount(0xFFFFFFFF)},
+      {"table one entry past the data", withCount(4)},
+      {"offset past the end", MakeProfile({{Sig("wtpt"), 165, 0}}, 20)},
+      {"data one byte past the end", MakeProfile({{Sig("wtpt"), 144, 21}}, 20)},
+      {"size wraps", MakeProfile({{Sig("wtpt"), 144, 0xFFFFFFF0}}, 20)},
+      {"offset wraps", MakeProfile({{Sig("wtpt"), 0xFFFFFFF0, 0x20}}, 20)},
+      {"duplicate tags", MakeProfile({{Sig("wtpt"), 156, 4}, {Sig("wtpt"), 160, 4}}, 20)},
+      {"real profile cut in half", Bytes(srgb.begin(), srgb.begin() + srgb.size() / 2)},
+      {"past a smaller size field", [] {
+         Bytes b = MakeProfile({{Sig("wtpt"), 144, 20}}, 20);
+         PutBE32(b, 0, 160);  // the profile ends before its tag does
+         return b;
+       }()},
+  };
+  for (const Case& c : cases) {
+    SCOPED_TRACE(c.what);
+    SetLastError(kSentinel);
+    EXPECT_EQ(OpenMemory(c.bytes), nullptr);
+    EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_INVALID_PROFILE));
+  }
+  // The same limits accept a profile that just fits.
+  for (const Bytes& fits : {MakeProfile({{Sig("wtpt"), 144, 20}}, 20), MakeProfile({{Sig("wtpt"), 164, 0}}, 20),
+                            withCount(1)}) {
+    HPROFILE h = OpenMemory(fits);
+    EXPECT_NE(h, nullptr);
+    if (h) CloseColorProfile(h);
+  }
+}
+
+// Cutting into tag data makes the file unreadable; cutting only the final pad byte
+// (sRGB.icc's last tag ends one byte before the file does) leaves a readable profile
+// whose size field no longer matches, so it is not valid.
+TEST_F(ProfileFiles, TruncatedFiles) {
+  const Bytes srgb = ReadBytes(IccPath("sRGB.icc"));
+  WriteBytes(Posix("cut.icc"), Bytes(srgb.begin(), srgb.end() - 8));
+  SetLastError(kSentinel);
+  EXPECT_EQ(OpenPath(Win("cut.icc"), PROFILE_READ, OPEN_EXISTING), nullptr);
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_INVALID_PROFILE));
+
+  WriteBytes(Posix("pad.icc"), Bytes(srgb.begin(), srgb.end() - 1));
+  HPROFILE h = OpenPath(Win("pad.icc"), PROFILE_READ, OPEN_EXISTING);
+  ASSERT_NE(h, nullptr);
+  BOOL valid = TRUE;
+  SetLastError(kSentinel);
+  EXPECT_FALSE(IsColorProfileValid(h, &valid));
+  EXPECT_FALSE(valid);
+  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_INVALID_PROFILE));
+  CloseColorProfile(h);
+}
+
+void CollectProfiles(const std::string& dir, std::vector<std::string>& out) {
+  DIR* d = opendir(dir.c_str());
+  if (d == nullptr) return;
+  while (dirent* e = readdir(d)) {
+    const std::string name = e->d_name;
+    if (name == "." || name == "..") continue;
+    const std::string path = dir + "/" + name;
+    struct stat st;
+    if (stat(path.c_str(), &st) != 0) continue;
+    if (S_ISDIR(st.st_mode)) {
+      CollectProfiles(path, out);
+    } else if (name.size() > 4) {
+      std::string ext = name.substr(name.size() - 4);
+      for (char& c : ext) c = static_cast<char>(std::tolower(static_cast<unsigned char>(c)));
+      if (ext == ".icc" || ext == ".icm") out.push_back(path);
+    }
+  }
+  closedir(d);
+}
+
+TEST(IsColorProfileValid, EveryRealProfileIsValid) {
+  std::vector<std::string> paths;
+  CollectProfiles(TINTWELL_ICC_DIR, paths);
+  CollectProfiles("/usr/share/color/argyll/ref", paths);
+  ASSERT_GE(paths.size(), 40u);
+  for (const std::string& path : paths) {
+    SCOPED_TRACE(path);
+    HPROFILE h = OpenPath(win32::WindowsPathFromPosix(path), PROFILE_READ, OPEN_EXISTING);
+    ASSERT_NE(h, nullptr);
+    BOOL valid = FALSE;
+    SetLastError(kSentinel);
+    EXPECT_TRUE(IsColorProfileValid(h, &valid));
+    EXPECT_TRUE(valid);
+    EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+    CloseColorProfile(h);
+  }
+}
+
+TEST(IsColorProfileValid, NeedsTheTagsOfItsClass) {
+  const std::uint32_t matrix[] = {Sig("rXYZ"), Sig("gXYZ"), Sig("bXYZ"), Sig("rTRC"), Sig("gTRC"), Sig("bTRC")};
+  const std::vector<std::uint32_t> shaper(std::begin(matrix), std::end(matrix));
+  const std::vector<std::uint32_t> missingOne(std::begin(matrix), std::end(matrix) - 1);
+  struct Case {
+    const char* what;
+    Bytes bytes;
+    BOOL valid;
+  } cases[] = {
+      {"RGB matrix-shaper", MakeTagged(CLASS_MONITOR, SPACE_RGB, shaper), TRUE},
+      {"RGB without bTRC", MakeTagged(CLASS_MONITOR, SPACE_RGB, missingOne), FALSE},
+      {"RGB with A2B0 only", MakeTagged(CLASS_SCANNER, SPACE_RGB, {Sig("A2B0")}), TRUE},
+      {"CMYK printer with B2A0", MakeTagged(CLASS_PRINTER, SPACE_CMYK, {Sig("B2A0")}), TRUE},
+      {"CMYK printer without tables", MakeTagged(CLASS_PRINTER, SPACE_CMYK, {Sig("kTRC")}), FALSE},
+      {"gray", MakeTagged(CLASS_MONITOR, SPACE_GRAY, {Sig("kTRC")}), TRUE},
+      {"gray without kTRC", MakeTagged(CLASS_MONITOR, SPACE_GRAY, {Sig("wtpt")}), FALSE},
+      {"link", MakeTagged(CLASS_LINK, SPACE_RGB, {Sig("A2B0")}), TRUE},
+      {"link with B2A0 only", MakeTagged(CLASS_LINK, SPACE_RGB, {Sig("B2A0")}), FALSE},
+      {"abstract", MakeTagged(CLASS_ABSTRACT, SPACE_Lab, {Sig("A2B0")}), TRUE},
+      {"named", MakeTagged(CLASS_NAMED, SPACE_RGB, {Sig("ncl2")}), TRUE},
+      {"named without ncl2", MakeTagged(CLASS_NAMED, SPACE_RGB, {Sig("A2B0")}), FALSE},
+      {"unknown class", MakeTagged(Sig("xxxx"), SPACE_RGB, {Sig("A2B0")}), FALSE},
+      {"required tag too short", MakeTagged(CLASS_LINK, SPACE_RGB, {Sig("A2B0")}, 8), FALSE},
+      {"header only", MakeTagged(CLASS_MONITOR, SPACE_RGB, {}), FALSE},
+      {"version 5", [] { Bytes b = MakeTagged(CLASS_LINK, SPACE_RGB, {Sig("A2B0")}); b[8] = 5; return b; }(), FALSE},
+      {"size field beyond the data", [] {
+         Bytes b = MakeTagged(CLASS_LINK, SPACE_RGB, {Sig("A2B0")});
+         PutBE32(b, 0, static_cast<std::uint32_t>(b.size() + 4));
+         return b;
+       }(), FALSE},
+  };
+  for (const Case& c : cases) {
+    SCOPED_TRACE(c.what);
+    HPROFILE h = OpenMemory(c.bytes);
+    ASSERT_NE(h, nullptr);
+    BOOL valid = 7;
+    SetLastError(kSentinel);
+    EXPECT_EQ(IsColorProfileValid(h, &valid), c.valid);
+    EXPECT_EQ(valid, c.valid);
+    EXPECT_EQ(GetLastError(), c.valid ? ERROR_SUCCESS : static_cast<DWORD>(ERROR_INVALID_PROFILE));
+    CloseColorProfile(h);
+  }
+}
+
+TEST(IsColorProfileValid, FollowsEditsAndChecksItsArgument) {
+  HPROFILE h = OpenMemory(ReadBytes(IccPath("sRGB.icc")));
+  ASSERT_NE(h, nullptr);
+  SetLastError(kSentinel);
+  EXPECT_FALSE(IsColorProfileValid(h, nullptr));
+  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
+  BOOL valid = FALSE;
+  // A size change re-lays the profile out and keeps the size field right.
+  ASSERT_TRUE(SetColorProfileElementSize(h, Sig("desc"), 3));
+  EXPECT_TRUE(IsColorProfileValid(h, &valid));
+  PROFILEHEADER header;
+  ASSERT_TRUE(GetColorProfileHeader(h, &header));
+  std::vector<std::uint8_t> bytes;
+  ASSERT_TRUE(win32::icm::SerializeProfile(h, bytes));
+  EXPECT_EQ(header.phSize, bytes.size());
+  // A size field written over no longer matches.
+  header.phSize += 4;
+  ASSERT_TRUE(SetColorProfileHeader(h, &header));
+  EXPECT_FALSE(IsColorProfileValid(h, &valid));
+  EXPECT_FALSE(valid);
+  // Removing a needed tag makes it unusable.
+  header.phSize -= 4;
+  ASSERT_TRUE(SetColorProfileHeader(h, &header));
+  EXPECT_TRUE(IsColorProfileValid(h, &valid));
+  ASSERT_TRUE(SetColorProfileElementSize(h, Sig("gXYZ"), 0));
+  EXPECT_FALSE(IsColorProfileValid(h, &valid));
+  CloseColorProfile(h);
+}
+
+class ColorDirectory : public TempFolderTest {};
+
+TEST_F(ColorDirectory, ReportsBytesIncludingTheTerminator) {
+  const std::string expected = win32::WindowsPathFromPosix(colorDir_);
+  const DWORD needed = static_cast<DWORD>(expected.size() + 1);
+  DWORD size = 0;
+  SetLastError(kSentinel);
+  EXPECT_FALSE(GetColorDirectoryA(nullptr, nullptr, &size));
+  EXPECT_EQ(GetLastError(), ERROR_INSUFFICIENT_BUFFER);
+  EXPECT_EQ(size, needed);
+
+  std::string buffer(needed + 8, '#');
+  size = needed - 1;
+  SetLastError(kSentinel);
+  EXPECT_FALSE(GetColorDirectoryA(nullptr, buffer.data(), &size));
+  EXPECT_EQ(GetLastError(), ERROR_INSUFFICIENT_BUFFER);
+  EXPECT_EQ(size, needed);
+  EXPECT_EQ(buffer, std::string(needed + 8, '#'));
+
+  size = needed;
+  SetLastError(kSentinel);
+  ASSERT_TRUE(GetColorDirectoryA(nullptr, buffer.data(), &size));
+  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+  EXPECT_EQ(size, needed);
+  EXPECT_EQ(std::string(buffer.c_str()), expected);
+  EXPECT_NE(expected.back(), '\\');
+  EXPECT_EQ(buffer[needed], '#');
+  struct stat st;
+  EXPECT_EQ(stat(colorDir_.c_str(), &st), 0) << "created when first needed";
+
+  SetLastError(kSentinel);
+  EXPECT_FALSE(GetColorDirectoryA("machine", buffer.data(), &size));
+  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
+  SetLastError(kSentinel);
+  EXPECT_FALSE(GetColorDirectoryA(nullptr, buffer.data(), nullptr));
+  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
+}
+
+TEST_F(ColorDirectory, FallsBackToTheFreedesktopLocation) {
+  const char* savedHome = getenv("HOME");
+  const std::string home = savedHome ? savedHome : "";
+  const char* savedXdg = getenv("XDG_DATA_HOME");
+  const std::string xdg = savedXdg ? savedXdg : "";
+  unsetenv("TINTWELL_COLOR_DIR");
+  auto query = [] {
+    char buffer[MAX_PATH];
+    DWORD size = sizeof buffer;
+    return GetColorDirectoryA(nullptr, buffer, &size) ? std::string(buffer) : std::string("failed");
+  };
+  setenv("XDG_DATA_HOME", (root_ + "/xdg/").c_str(), 1);
+  EXPECT_EQ(query(), win32::WindowsPathFromPosix(root_ + "/xdg/icc"));
+  unsetenv("XDG_DATA_HOME");
+  setenv("HOME", root_.c_str(), 1);
+  EXPECT_EQ(query(), win32::WindowsPathFromPosix(root_ + "/.local/share/icc"));
+  if (savedHome) setenv("HOME", home.c_str(), 1); else unsetenv("HOME");
+  if (savedXdg) setenv("XDG_DATA_HOME", xdg.c_str(), 1);
+}
+
+TEST_F(ColorDirectory, InstallCopiesAndReplaces) {
+  SetLastError(kSentinel);
+  EXPECT_FALSE(InstallColorProfileA("machine", Win("x.icc").c_str()));
+  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
+  SetLastError(kSentinel);
+  EXPECT_FALSE(InstallColorProfileA(nullptr, nullptr));
+  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
+  SetLastError(kSentinel);
+  EXPECT_FALSE(InstallColorProfileA(nullptr, Win("missing.icc").c_str()));
+  EXPECT_EQ(GetLastError(), ERROR_FILE_NOT_FOUND);
+  SetLastError(kSentinel);
+  EXPECT_FALSE(InstallColorProfileA(nullptr, "D:\\x.icc"));
+  EXPECT_EQ(GetLastError(), ERROR_PATH_NOT_FOUND);
+
+  const std::string path = CopyOf("sRGB.icc", "Work 1.icc");
+  SetLastError(kSentinel);
+  ASSERT_TRUE(InstallColorProfileA(nullptr, path.c_str()));
+  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+  EXPECT_EQ(ReadBytes(colorDir_ + "/Work 1.icc"), ReadBytes(IccPath("sRGB.icc")));
+
+  // A file of the same name from an earlier run is replaced.
+  CopyOf("Gray.icc", "Work 1.icc");
+  SetLastError(kSentinel);
+  ASSERT_TRUE(InstallColorProfileA(nullptr, path.c_str()));
+  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+  EXPECT_EQ(ReadBytes(colorDir_ + "/Work 1.icc"), ReadBytes(IccPath("Gray.icc")));
+
+  // Installing the installed copy itself leaves it as it is.
+  SetLastError(kSentinel);
+  ASSERT_TRUE(InstallColorProfileA(nullptr, win32::WindowsPathFromPosix(colorDir_ + "/Work 1.icc").c_str()));
+  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+  EXPECT_EQ(ReadBytes(colorDir_ + "/Work 1.icc"), ReadBytes(IccPath("Gray.icc")));
+}
+
+}  // namespace

@@ -1,0 +1,273 @@
+// Conformance of OpenColorProfileA, CloseColorProfile, the header calls and
+// SerializeProfile: parameter checks first, then behaviour, with the exact last error.
+#include <sys/stat.h>
+
+#include <cstring>
+#include <functional>
+#include <memory>
+
+#include "handle_table.h"
+#include "icc_test_support.h"
+#include "icm/profile_store.h"
+
+namespace {
+
+using namespace icctest;
+
+TEST(OpenColorProfileA, RefusesBadArguments) {
+  const Bytes srgb = ReadBytes(IccPath("sRGB.icc"));
+  const std::string path = win32::WindowsPathFromPosix(IccPath("sRGB.icc"));
+  char* name = const_cast<char*>(path.c_str());
+  void* mem = const_cast<std::uint8_t*>(srgb.data());
+  const DWORD size = static_cast<DWORD>(srgb.size());
+  struct Case {
+    const char* what;
+    bool nullProfile;
+    PROFILE profile;
+    DWORD access, creation, error;
+  } cases[] = {
+      {"null PROFILE", true, {}, PROFILE_READ, OPEN_EXISTING, ERROR_INVALID_PARAMETER},
+      {"null data", false, {PROFILE_FILENAME, nullptr, 0}, PROFILE_READ, OPEN_EXISTING, ERROR_INVALID_PARAMETER},
+      {"type 0", false, {0, name, 0}, PROFILE_READ, OPEN_EXISTING, ERROR_INVALID_PARAMETER},
+      {"type 3", false, {3, mem, size}, PROFILE_READ, OPEN_EXISTING, ERROR_INVALID_PARAMETER},
+      {"access 0", false, {PROFILE_FILENAME, name, 0}, 0, OPEN_EXISTING, ERROR_INVALID_PARAMETER},
+      {"access 3", false, {PROFILE_MEMBUFFER, mem, size}, 3, OPEN_EXISTING, ERROR_INVALID_PARAMETER},
+      {"creation 0", false, {PROFILE_FILENAME, name, 0}, PROFILE_READ, 0, ERROR_INVALID_PARAMETER},
+      {"creation 6", false, {PROFILE_FILENAME, name, 0}, PROFILE_READ, 6, ERROR_INVALID_PARAMETER},
+      {"drive C:", false, {PROFILE_FILENAME, const_cast<char*>("C:\\x.icc"), 0}, PROFILE_READ, OPEN_EXISTING,
+       ERROR_PATH_NOT_FOUND},
+      {"memory too short", false, {PROFILE_MEMBUFFER, mem, 131}, PROFILE_READ, OPEN_EXISTING,
+       ERROR_INVALID_PROFILE},
+  };
+  for (Case& c : cases) {
+    SCOPED_TRACE(c.what);
+    SetLastError(kSentinel);
+    EXPECT_EQ(OpenColorProfileA(c.nullProfile ? nullptr : &c.profile, c.access, 0, c.creation), nullptr);
+    EXPECT_EQ(GetLastError(), c.error);
+  }
+}
+
+TEST(OpenColorProfileA, ReadsARealProfileInFileOrder) {
+  const Bytes raw = ReadBytes(IccPath("sRGB.icc"));
+  const std::vector<TagEntry> table = TagTable(raw);
+  SetLastError(kSentinel);
+  HPROFILE h = OpenPath(win32::WindowsPathFromPosix(IccPath("sRGB.icc")), PROFILE_READ, OPEN_EXISTING);
+  ASSERT_NE(h, nullptr);
+  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+
+  DWORD count = 0;
+  SetLastError(kSentinel);
+  ASSERT_TRUE(GetCountColorProfileElements(h, &count));
+  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+  ASSERT_EQ(count, table.size());
+  for (DWORD i = 0; i < count; ++i) {
+    TAGTYPE tag = 0;
+    ASSERT_TRUE(GetColorProfileElementTag(h, i + 1, &tag));
+    EXPECT_EQ(tag, table[i].signature) << i;
+  }
+  SetLastError(kSentinel);
+  EXPECT_TRUE(CloseColorProfile(h));
+  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+}
+
+TEST(CloseColorProfile, RefusesUnknownClosedAndForeignHandles) {
+  HPROFILE h = OpenMemory(ReadBytes(IccPath("sRGB.icc")));
+  ASSERT_NE(h, nullptr);
+  ASSERT_TRUE(CloseColorProfile(h));
+  HANDLE transform = win32::Handles().Insert(win32::HandleKind::Transform, std::make_shared<int>(0));
+  for (HANDLE bad : {HANDLE(nullptr), h, transform, HANDLE(reinterpret_cast<void*>(0x12345))}) {
+    SetLastError(kSentinel);
+    EXPECT_FALSE(CloseColorProfile(bad));
+    EXPECT_EQ(GetLastError(), ERROR_INVALID_HANDLE);
+  }
+  // The transform handle survived the attempt.
+  EXPECT_NE(win32::Handles().Remove<int>(transform, win32::HandleKind::Transform), nullptr);
+}
+
+// Every call taking a profile refuses a handle that is not an open profile.
+TEST(ProfileCalls, RefuseHandlesThatAreNotOpenProfiles) {
+  HPROFILE closed = OpenMemory(ReadBytes(IccPath("sRGB.icc")));
+  ASSERT_TRUE(CloseColorProfile(closed));
+  HANDLE transform = win32::Handles().Insert(win32::HandleKind::Transform, std::make_shared<int>(0));
+  PROFILEHEADER header;
+  BOOL flag;
+  DWORD count = 4;
+  TAGTYPE tag;
+  std::uint8_t buffer[4] = {};
+  std::vector<std::uint8_t> bytes;
+  for (HANDLE bad : {HANDLE(nullptr), closed, transform}) {
+    const std::pair<const char*, std::function<BOOL()>> calls[] = {
+        {"IsColorProfileValid", [&] { return IsColorProfileValid(bad, &flag); }},
+        {"GetColorProfileHeader", [&] { return GetColorProfileHeader(bad, &header); }},
+        {"SetColorProfileHeader", [&] { return SetColorProfileHeader(bad, &header); }},
+        {"GetCountColorProfileElements", [&] { return GetCountColorProfileElements(bad, &count); }},
+        {"GetColorProfileElementTag", [&] { return GetColorProfileElementTag(bad, 1, &tag); }},
+        {"IsColorProfileTagPresent", [&] { return IsColorProfileTagPresent(bad, Sig("desc"), &flag); }},
+        {"GetColorProfileElement",
+         [&] { return GetColorProfileElement(bad, Sig("desc"), 0, &count, buffer, &flag); }},
+        {"SetColorProfileElement", [&] { return SetColorProfileElement(bad, Sig("desc"), 0, &count, buffer); }},
+        {"SetColorProfileElementSize", [&] { return SetColorProfileElementSize(bad, Sig("desc"), 8); }},
+        {"SerializeProfile", [&] { return win32::icm::SerializeProfile(bad, bytes); }},
+    };
+    for (const auto& call : calls) {
+      SCOPED_TRACE(call.first);
+      SetLastError(kSentinel);
+      EXPECT_FALSE(call.second());
+      EXPECT_EQ(GetLastError(), ERROR_INVALID_HANDLE);
+    }
+  }
+  win32::Handles().Remove<int>(transform, win32::HandleKind::Transform);
+}
+
+class OpenModes : public TempFolderTest {};
+
+TEST_F(OpenModes, CreationModesOnExistingAndMissingFiles) {
+  const Bytes srgb = ReadBytes(IccPath("sRGB.icc"));
+  struct Case {
+    DWORD creation;
+    bool exists;
+    DWORD error;        // 0: opens
+    bool blank;         // opens as a blank profile
+  } cases[] = {
+      {OPEN_EXISTING, true, 0, false},   {OPEN_EXISTING, false, ERROR_FILE_NOT_FOUND, false},
+      {OPEN_ALWAYS, true, 0, false},     {OPEN_ALWAYS, false, 0, true},
+      {CREATE_NEW, true, ERROR_FILE_EXISTS, false}, {CREATE_NEW, false, 0, true},
+      {CREATE_ALWAYS, true, 0, true},    {CREATE_ALWAYS, false, 0, true},
+      {TRUNCATE_EXISTING, true, 0, true}, {TRUNCATE_EXISTING, false, ERROR_FILE_NOT_FOUND, false},
+  };
+  int n = 0;
+  for (const Case& c : cases) {
+    SCOPED_TRACE(testing::Message() << "creation " << c.creation << (c.exists ? " existing" : " missing"));
+    const std::string name = "p" + std::to_string(n++) + ".icc";
+    if (c.exists) WriteBytes(Posix(name), srgb);
+    SetLastError(kSentinel);
+    HPROFILE h = OpenPath(Win(name), PROFILE_READWRITE, c.creation);
+    if (c.error != 0) {
+      EXPECT_EQ(h, nullptr);
+      EXPECT_EQ(GetLastError(), c.error);
+      continue;
+    }
+    ASSERT_NE(h, nullptr);
+    EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+    DWORD count = 99;
+    ASSERT_TRUE(GetCountColorProfileElements(h, &count));
+    EXPECT_EQ(count, c.blank ? 0u : TagTable(srgb).size());
+    ASSERT_TRUE(CloseColorProfile(h));
+    const Bytes after = ReadBytes(Posix(name));
+    if (c.blank) {
+      // Written at close: header with 'acsp', no tags, the size field matching.
+      ASSERT_EQ(after.size(), 132u);
+      EXPECT_EQ(BE32(after, 0), 132u);
+      EXPECT_EQ(BE32(after, 36), Sig("acsp"));
+      EXPECT_EQ(BE32(after, 128), 0u);
+    } else {
+      EXPECT_EQ(after, srgb);  // opened, untouched, not rewritten
+    }
+  }
+}
+
+TEST_F(OpenModes, ReadOnlyBlankProfileIsNeverWritten) {
+  HPROFILE h = OpenPath(Win("ro.icc"), PROFILE_READ, CREATE_ALWAYS);
+  ASSERT_NE(h, nullptr);
+  ASSERT_TRUE(CloseColorProfile(h));
+  struct stat st;
+  EXPECT_NE(stat(Posix("ro.icc").c_str(), &st), 0);
+}
+
+TEST_F(OpenModes, PathErrors) {
+  SetLastError(kSentinel);
+  EXPECT_EQ(OpenPath(Win("no/such/folder.icc"), PROFILE_READ, OPEN_EXISTING), nullptr);
+  EXPECT_EQ(GetLastError(), ERROR_PATH_NOT_FOUND);
+  SetLastError(kSentinel);
+  EXPECT_EQ(OpenPath(Win("no/such/folder.icc"), PROFILE_READWRITE, CREATE_ALWAYS), nullptr);
+  EXPECT_EQ(GetLastError(), ERROR_PATH_NOT_FOUND);
+  SetLastError(kSentinel);
+  EXPECT_EQ(OpenPath(Win(""), PROFILE_READ, OPEN_EXISTING), nullptr);  // a folder
+  EXPECT_EQ(GetLastError(), ERROR_ACCESS_DENIED);
+  SetLastError(kSentinel);
+  EXPECT_EQ(OpenPath(Win(std::string(MAX_PATH, 'n')), PROFILE_READ, OPEN_EXISTING), nullptr);
+  EXPECT_EQ(GetLastError(), ERROR_FILENAME_EXCED_RANGE);
+}
+
+TEST_F(OpenModes, BareNamesAreFoundInTheColorDirectory) {
+  ASSERT_EQ(mkdir(colorDir_.c_str(), 0777), 0);
+  WriteBytes(colorDir_ + "/Bare Name.icm", ReadBytes(IccPath("Gray.icc")));
+  SetLastError(kSentinel);
+  HPROFILE h = OpenPath("Bare Name.icm", PROFILE_READ, OPEN_EXISTING);
+  ASSERT_NE(h, nullptr);
+  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+  PROFILEHEADER header;
+  ASSERT_TRUE(GetColorProfileHeader(h, &header));
+  EXPECT_EQ(header.phDataColorSpace, static_cast<DWORD>(SPACE_GRAY));
+  EXPECT_TRUE(CloseColorProfile(h));
+  SetLastError(kSentinel);
+  EXPECT_EQ(OpenPath("missing.icm", PROFILE_READ, OPEN_EXISTING), nullptr);
+  EXPECT_EQ(GetLastError(), ERROR_FILE_NOT_FOUND);
+}
+
+TEST(ColorProfileHeader, ComesOutInHostOrder) {
+  const Bytes raw = ReadBytes(IccPath("sRGB.icc"));
+  HPROFILE h = OpenMemory(raw, PROFILE_READ);
+  ASSERT_NE(h, nullptr);
+  SetLastError(kSentinel);
+  EXPECT_FALSE(GetColorProfileHeader(h, nullptr));
+  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
+
+  PROFILEHEADER header;
+  SetLastError(kSentinel);
+  ASSERT_TRUE(GetColorProfileHeader(h, &header));
+  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+  EXPECT_EQ(header.phSize, raw.size());
+  EXPECT_EQ(header.phClass, static_cast<DWORD>(CLASS_MONITOR));
+  EXPECT_EQ(header.phDataColorSpace, static_cast<DWORD>(SPACE_RGB));
+  EXPECT_EQ(header.phConnectionSpace, static_cast<DWORD>(SPACE_XYZ));
+  EXPECT_EQ(header.phSignature, 0x61637370u);
+  EXPECT_EQ(header.phIlluminant.ciexyzX, 0x0000F6D6);
+  EXPECT_EQ(header.phIlluminant.ciexyzY, 0x00010000);
+  EXPECT_EQ(header.phIlluminant.ciexyzZ, 0x0000D32D);
+  // The file's date is 2004-08-13 12:18:06, six big-endian 16-bit fields read as words.
+  EXPECT_EQ(header.phDateTime[0], (2004u << 16) | 8u);
+  EXPECT_EQ(header.phDateTime[1], (13u << 16) | 12u);
+  EXPECT_EQ(header.phDateTime[2], (18u << 16) | 6u);
+
+  SetLastError(kSentinel);
+  EXPECT_FALSE(SetColorProfileHeader(h, &header));
+  EXPECT_EQ(GetLastError(), ERROR_ACCESS_DENIED);
+  EXPECT_TRUE(CloseColorProfile(h));
+}
+
+TEST(ColorProfileHeader, SetStoresTheBytesAsGiven) {
+  HPROFILE h = OpenMemory(ReadBytes(IccPath("sRGB.icc")));
+  ASSERT_NE(h, nullptr);
+  SetLastError(kSentinel);
+  EXPECT_FALSE(SetColorProfileHeader(h, nullptr));
+  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
+
+  PROFILEHEADER in;
+  ASSERT_TRUE(GetColorProfileHeader(h, &in));
+  in.phSize = 12345;
+  in.phClass = CLASS_PRINTER;
+  in.phDateTime[0] = (2026u << 16) | 12;
+  in.phRenderingIntent = INTENT_SATURATION;
+  for (int i = 0; i < 44; ++i) in.phReserved[i] = static_cast<BYTE>(i + 1);
+  SetLastError(kSentinel);
+  ASSERT_TRUE(SetColorProfileHeader(h, &in));
+  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+  PROFILEHEADER out;
+  ASSERT_TRUE(GetColorProfileHeader(h, &out));
+  EXPECT_EQ(std::memcmp(&in, &out, sizeof in), 0);
+
+  // On disk every word is big-endian again; the size field is the real size.
+  std::vector<std::uint8_t> bytes;
+  SetLastError(kSentinel);
+  ASSERT_TRUE(win32::icm::SerializeProfile(h, bytes));
+  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+  EXPECT_EQ(BE32(bytes, 0), bytes.size());
+  EXPECT_EQ(BE32(bytes, 12), Sig("prtr"));
+  EXPECT_EQ(BE32(bytes, 24), (2026u << 16) | 12);
+  EXPECT_EQ(BE32(bytes, 64), static_cast<std::uint32_t>(INTENT_SATURATION));
+  EXPECT_EQ(BE32(bytes, 84), 0x04030201u);  // reserved bytes swapped as words on the way in
+  EXPECT_TRUE(CloseColorProfile(h));
+}
+
+}  // namespace
