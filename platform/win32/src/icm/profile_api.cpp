@@ -75,10 +75,10 @@ DWORD OpenFile(const char* name, DWORD creation, OpenProfile& profile) {
 
   const bool keepContent = exists && (creation == OPEN_EXISTING || creation == OPEN_ALWAYS);
   if (keepContent) {
-    std::vector<std::uint8_t> bytes;
-    code = ReadFileBytes(profile.path, bytes);
+    auto bytes = std::make_shared<Bytes>();
+    code = ReadFileBytes(profile.path, *bytes);
     if (code != ERROR_SUCCESS) return code;
-    return IccContainer::Parse(bytes.data(), bytes.size(), profile.icc);
+    return IccContainer::Parse(std::move(bytes), profile.icc);
   }
   if (!exists && (creation == OPEN_EXISTING || creation == TRUNCATE_EXISTING)) {
     struct stat folderStat;
@@ -119,8 +119,8 @@ extern "C" HPROFILE WINAPI OpenColorProfileA(PPROFILE pProfile, DWORD dwDesiredA
     if (pProfile->dwType == PROFILE_FILENAME) {
       code = OpenFile(static_cast<const char*>(pProfile->pProfileData), dwCreationMode, *profile);
     } else if (pProfile->dwType == PROFILE_MEMBUFFER) {
-      code = IccContainer::Parse(static_cast<const std::uint8_t*>(pProfile->pProfileData),
-                                 pProfile->cbDataSize, profile->icc);
+      const auto* data = static_cast<const std::uint8_t*>(pProfile->pProfileData);
+      code = IccContainer::Parse(std::make_shared<Bytes>(data, data + pProfile->cbDataSize), profile->icc);
     } else {
       code = ERROR_INVALID_PARAMETER;
     }
@@ -220,7 +220,7 @@ extern "C" BOOL WINAPI GetColorProfileElement(HPROFILE hProfile, TAGTYPE tag, DW
   auto profile = Lookup(hProfile);
   if (!profile) return Fail(ERROR_INVALID_HANDLE);
   if (pcbElement == nullptr) return Fail(ERROR_INVALID_PARAMETER);
-  const IccContainer::Block* element = profile->icc.Element(tag);
+  const Block* element = profile->icc.Element(tag);
   if (element == nullptr) return Fail(ERROR_TAG_NOT_FOUND);
   if (pElement == nullptr) {
     *pcbElement = static_cast<DWORD>(element->size());
@@ -243,7 +243,7 @@ extern "C" BOOL WINAPI SetColorProfileElement(HPROFILE hProfile, TAGTYPE tag, DW
     if (!profile) return Fail(ERROR_INVALID_HANDLE);
     if (pcbElement == nullptr || pElement == nullptr) return Fail(ERROR_INVALID_PARAMETER);
     if (!profile->writable) return Fail(ERROR_ACCESS_DENIED);
-    const IccContainer::Block* element = profile->icc.Element(tag);
+    const Block* element = profile->icc.Element(tag);
     if (element == nullptr) return Fail(ERROR_TAG_NOT_FOUND);
     if (dwOffset > element->size()) return Fail(ERROR_INVALID_PARAMETER);
     *pcbElement = static_cast<DWORD>(profile->icc.WriteElement(tag, dwOffset, pElement, *pcbElement));
