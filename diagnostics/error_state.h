@@ -22,6 +22,10 @@ constexpr int32_t kErrorNilProfile = -404;
 // debugger wants error events.
 void SetCMError(int32_t code);
 
+// Reports the calling thread's Windows last-error value through SetCMError (0 clears
+// the error and raises nothing).
+void ReportSystemError();
+
 // Global methods.
 int32_t CMError();
 REALstring CMErrorMessage();

@@ -5,13 +5,13 @@
 
 #include "plugin_records.h"
 
-inline void* GetInstanceData(REALobject object, const REALclassDefinition& definition) {
+inline void* GetInstanceDataOf(REALobject object, const REALclassDefinition& definition) {
   return reinterpret_cast<char*>(object) + definition.forSystemUse;
 }
 
 template <class Record>
 Record* GetInstanceData(REALobject object, const REALclassDefinition& definition) {
-  return static_cast<Record*>(GetInstanceData(object, definition));
+  return static_cast<Record*>(GetInstanceDataOf(object, definition));
 }
 
 #endif

@@ -1,9 +1,11 @@
 #include "registration.h"
 
 #include "cmcolor.h"
+#include "colorworld.h"
 #include "debugger.h"
 #include "error_state.h"
 #include "host_bridge.h"
+#include "profile.h"
 
 namespace {
 
@@ -12,6 +14,8 @@ namespace {
 REALclassDefinition* const kClasses[] = {
     &halvoDebuggerClass,
     &CMColorClass,
+    &ProfileClass,
+    &ColorWorldClass,
 };
 
 // Global methods in registration order; a method joins this table once it is built.
@@ -20,6 +24,9 @@ REALmethodDefinition globalMethods[] = {
     {reinterpret_cast<REALproc>(&halvoUnregisterDebugger), nullptr, "halvoUnregisterDebugger()"},
     {reinterpret_cast<REALproc>(&CMError), nullptr, "CMError() as Integer"},
     {reinterpret_cast<REALproc>(&CMErrorMessage), nullptr, "CMErrorMessage() as string"},
+    {reinterpret_cast<REALproc>(&NewConcatColorWorld), nullptr,
+     "NewConcatColorWorld(keyindex as Integer, p1 as Profile, p2 as Profile, p3 as Profile, p4 as Profile) as "
+     "ColorWorld"},
 };
 
 }  // namespace

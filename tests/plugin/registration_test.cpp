@@ -19,7 +19,7 @@ TEST_F(PluginTest, RegistersItsClassesAndGlobalsWithTheStoredDeclarations) {
   const auto classes = rt->Classes();
   std::vector<std::string> names;
   for (const auto* c : classes) names.push_back(c->name);
-  EXPECT_EQ(names, (std::vector<std::string>{"halvoDebugger", "CMColor"}));
+  EXPECT_EQ(names, (std::vector<std::string>{"halvoDebugger", "CMColor", "Profile", "ColorWorld"}));
   const host::ClassInfo& debugger = *classes[0];
   EXPECT_EQ(debugger.name, "halvoDebugger");
   EXPECT_EQ(debugger.dataSize, 1u);
@@ -38,7 +38,9 @@ TEST_F(PluginTest, RegistersItsClassesAndGlobalsWithTheStoredDeclarations) {
                         "DebugString(aString as string)"}));
   EXPECT_EQ(globals, (std::vector<std::string>{"halvoRegisterDebugger(debugger as halvoDebugger)",
                                                "halvoUnregisterDebugger()", "CMError() as Integer",
-                                               "CMErrorMessage() as string"}));
+                                               "CMErrorMessage() as string",
+                                               "NewConcatColorWorld(keyindex as Integer, p1 as Profile, p2 as "
+                                               "Profile, p3 as Profile, p4 as Profile) as ColorWorld"}));
 
   const host::ClassInfo& color = *classes[1];
   EXPECT_EQ(color.properties.size(), 25u);

@@ -1,0 +1,111 @@
+// The Profile class definition: its properties and methods in registration order.
+#include <cstddef>
+
+#include "header_fields.h"
+#include "profile.h"
+
+namespace {
+
+using namespace header_fields;
+using namespace profile_members;
+
+template <class F>
+REALproc P(F f) {
+  return reinterpret_cast<REALproc>(f);
+}
+
+// A header property: its getter and setter with their no-profile behaviours.
+template <class Field, NoProfile GetPolicy, NoProfile SetPolicy>
+REALproperty Header(const char* name, const char* type) {
+  return {nullptr, name, type, 0, P(&Get<Field, GetPolicy>), P(&Set<Field, SetPolicy>), 0, 0, 0, 0};
+}
+
+template <class Field, NoProfile Policy>
+REALproperty Header(const char* name, const char* type) {
+  return Header<Field, Policy, Policy>(name, type);
+}
+
+// Type's get alone clears the last error first.
+REALstring GetType(REALobject self, intptr_t param) {
+  LastCMError = 0;
+  return Get<SignatureField<offsetof(PROFILEHEADER, phClass)>, NoProfile::Event>(self, param);
+}
+
+// The file signature is read-only in effect: its setter changes nothing.
+void SetSignature(REALobject, intptr_t, REALstring) {}
+
+constexpr std::size_t kFlags = offsetof(PROFILEHEADER, phProfileFlags);
+constexpr std::size_t kAttributes2 = offsetof(PROFILEHEADER, phAttributes) + 4;
+constexpr std::size_t kDate = offsetof(PROFILEHEADER, phDateTime);
+constexpr std::size_t kWhite = offsetof(PROFILEHEADER, phIlluminant);
+constexpr NoProfile kEvent = NoProfile::Event;
+constexpr NoProfile kSilent = NoProfile::Silent;
+constexpr NoProfile kUntested = NoProfile::NotTested;
+
+REALproperty properties[] = {
+    {nullptr, "Location", "Folderitem", 0, P(&GetLocation), nullptr, 0, 0, 0, 0},
+    {nullptr, "LocationType", "Integer", 0, P(&GetLocationType), nullptr, 0, 0, 0, 0},
+    {nullptr, "Type", "String", 0, P(&GetType),
+     P(&Set<SignatureField<offsetof(PROFILEHEADER, phClass)>, kEvent>), 0, 0, 0, 0},
+    Header<SignatureField<offsetof(PROFILEHEADER, phCMMType)>, kEvent>("CMM", "String"),
+    Header<IntegerField<offsetof(PROFILEHEADER, phRenderingIntent)>, kEvent>("RenderIntent", "Integer"),
+    Header<QualityField, kUntested>("Quality", "Integer"),
+    Header<SignatureField<offsetof(PROFILEHEADER, phDataColorSpace)>, kEvent, kSilent>("ColorSpace", "String"),
+    Header<SignatureField<offsetof(PROFILEHEADER, phConnectionSpace)>, kEvent>("ConnectionSpace", "String"),
+    Header<WhiteField<kWhite>, kEvent>("WhiteX", "Double"),
+    Header<WhiteField<kWhite + 4>, kEvent>("WhiteY", "Double"),
+    Header<WhiteField<kWhite + 8>, kEvent>("WhiteZ", "Double"),
+    Header<SignatureField<offsetof(PROFILEHEADER, phPlatform)>, kEvent>("Platform", "String"),
+    Header<SignatureField<offsetof(PROFILEHEADER, phManufacturer)>, kEvent>("Manufacturer", "String"),
+    Header<SignatureField<offsetof(PROFILEHEADER, phCreator)>, kEvent, kUntested>("Creator", "String"),
+    {nullptr, "Signature", "String", 0, P(&Get<SignatureField<offsetof(PROFILEHEADER, phSignature)>, kEvent>),
+     P(&SetSignature), 0, 0, 0, 0},
+    Header<IntegerField<offsetof(PROFILEHEADER, phSize)>, kUntested>("Size", "Integer"),
+    Header<IntegerField<offsetof(PROFILEHEADER, phVersion)>, kEvent>("Version", "Integer"),
+    Header<IntegerField<kFlags>, kEvent>("Flags", "Integer"),
+    Header<IntegerField<offsetof(PROFILEHEADER, phModel)>, kEvent>("Model", "Integer"),
+    Header<AttributeField<offsetof(PROFILEHEADER, phAttributes)>, kEvent>("Attribute1", "Integer"),
+    Header<AttributeField<kAttributes2>, kSilent, kEvent>("Attribute2", "Integer"),
+    Header<BitField<kAttributes2, 0, false>, kUntested>("Transparent", "Boolean"),
+    Header<BitField<kAttributes2, 1, false>, kUntested>("Matte", "Boolean"),
+    Header<BitField<kFlags, 0, false>, kUntested>("Embedded", "Boolean"),
+    Header<BitField<kFlags, 1, false>, kUntested>("EmbeddedUse", "Boolean"),
+    Header<BitField<kFlags, 18, true>, kUntested>("Interpolation", "Boolean"),
+    Header<BitField<kFlags, 19, true>, kUntested>("GamutCheck", "Boolean"),
+    Header<DateField<kDate, true>, kUntested>("Year", "Integer"),
+    Header<DateField<kDate, false>, kUntested>("Month", "Integer"),
+    Header<DateField<kDate + 4, true>, kUntested>("Day", "Integer"),
+    Header<DateField<kDate + 4, false>, kUntested>("Hour", "Integer"),
+    Header<DateField<kDate + 8, true>, kUntested>("Minute", "Integer"),
+    Header<DateField<kDate + 8, false>, kUntested>("Second", "Integer"),
+    {nullptr, "Modified", "Boolean", 0, P(&GetModified), nullptr, 0, 0, 0, 0},
+    {nullptr, "RefCount", "Integer", 0, P(&GetRefCount), nullptr, 0, 0, 0, 0},
+};
+
+REALmethodDefinition methods[] = {
+    {P(&ConstructFromFile), nullptr, "Profile(f as Folderitem)"},
+    {P(&ConstructWithIntent), nullptr, "Profile(f as Folderitem, intent as Integer, quality as Integer, CMM as String)"},
+    {P(&ConstructFromProfile), nullptr, "Profile(f as Folderitem, p as Profile)"},
+    {P(&SaveProfileAs), nullptr, "SaveProfileAs(f as folderitem)"},
+    {P(&SaveProfile), nullptr, "SaveProfile()"},
+    {P(&ValidProfile), nullptr, "ValidProfile() as Boolean"},
+};
+
+}  // namespace
+
+REALclassDefinition ProfileClass = {
+    REAL_PLUGIN_VERSION,
+    "Profile",
+    nullptr,
+    sizeof(ProfileData),
+    0,
+    nullptr,
+    P(&Destruct),
+    properties,
+    sizeof properties / sizeof properties[0],
+    methods,
+    sizeof methods / sizeof methods[0],
+    nullptr,
+    0,
+    0, 0, 0, 0, 0,
+};
