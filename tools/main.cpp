@@ -8,83 +8,128 @@
 #include <cstring>
 #include <exception>
 #include <string>
+#include <vector>
 
-#include "host/runtime.h"
+#include "commands.h"
+#include "session.h"
 
 namespace {
 
 constexpr int kExitFailure = 1;
 constexpr int kExitUsage = 2;
 
-const char kUsage[] =
-    "usage: tintwell [--plugin PATH] COMMAND [ARGS]\n"
-    "\n"
-    "Commands:\n"
-    "  list      load the plugin and list the classes and global methods it registers,\n"
-    "            with their declarations\n"
-    "\n"
-    "Options:\n"
-    "  --plugin PATH   the plugin library to load (default: $TINTWELL_PLUGIN, else\n"
-    "                  ../lib/libtintwell.so beside this program)\n"
-    "  -h, --help      show this help\n";
+void PrintUsage(std::FILE* to) {
+  std::fputs(
+      "usage: tintwell [OPTIONS] COMMAND [ARGS]\n"
+      "\n"
+      "Commands:\n"
+      "  info [PROFILE...]            header fields of each profile and whether it is valid\n"
+      "  convert SRC DST [VALUE...]   convert colours from SRC's colour space to DST's; with\n"
+      "                               no values, reads one colour a line from standard input\n"
+      "  gamut PROFILE L a b          whether a Lab colour lies inside PROFILE's gamut\n"
+      "  list                         the classes and global methods the plugin registers\n"
+      "\n"
+      "A PROFILE is a file, or one of the built-in profiles:\n",
+      to);
+  for (const tool::BuiltinProfile& b : tool::BuiltinProfiles()) std::fprintf(to, "  %-8s %s\n", b.name, b.description);
+  std::fputs(
+      "\n"
+      "Colour values, by the profile's colour space: RGB 0-255; CMYK, gray, XYZ, Yxy,\n"
+      "HSV, HLS 0-1; Lab and Luv L 0-100 with a, b (u, v) -128-128; 5-8 channels 0-255.\n"
+      "\n"
+      "Options:\n"
+      "  --intent N      rendering intent of source and destination (0 perceptual,\n"
+      "                  1 relative colorimetric, 2 saturation, 3 absolute colorimetric)\n"
+      "  --via PROFILE   a profile between source and destination (up to two)\n"
+      "  --json          machine-readable output\n"
+      "  --verbose       on failure, also show the plugin's trace\n"
+      "  --plugin PATH   the plugin to load (default: $TINTWELL_PLUGIN, else\n"
+      "                  ../lib/libtintwell.so beside this program)\n"
+      "  -h, --help      this help\n"
+      "\n"
+      "Exit status: 0 success, 1 a failed job, 2 a usage error.\n",
+      to);
+}
 
-// The plugin beside the tool, as the build and the install lay them out.
 std::string DefaultPluginPath() {
   if (const char* env = std::getenv("TINTWELL_PLUGIN"); env && *env) return env;
   char exe[PATH_MAX];
   const ssize_t n = readlink("/proc/self/exe", exe, sizeof exe - 1);
   if (n <= 0) return "libtintwell.so";
-  exe[n] = '\0';
-  std::string dir(exe);
+  std::string dir(exe, static_cast<std::size_t>(n));
   dir.erase(dir.rfind('/'));
   return dir + "/../lib/libtintwell.so";
 }
 
-int List(host::Runtime& runtime) {
-  std::printf("plugin interface version %d\n", runtime.pluginVersion());
-  for (const host::ClassInfo* cls : runtime.Classes()) {
-    std::printf("\nclass %s (%zu bytes of instance data)\n", cls->name.c_str(), cls->dataSize);
-    for (const auto& p : cls->properties)
-      std::printf("  property %s as %s%s\n", p.name.c_str(), host::TypeName(p.type).c_str(),
-                  p.readOnly ? " (read-only)" : "");
-    for (const auto& m : cls->methods) std::printf("  method   %s\n", m.declaration.c_str());
-    for (const auto& e : cls->events) std::printf("  event    %s\n", e.declaration.c_str());
-  }
-  std::printf("\nglobal methods\n");
-  for (const host::MethodInfo* m : runtime.Globals()) std::printf("  %s\n", m->declaration.c_str());
-  return runtime.RegistrationErrors().empty() ? 0 : kExitFailure;
+int Usage(const std::string& message) {
+  std::fprintf(stderr, "tintwell: %s\n(see tintwell --help)\n", message.c_str());
+  return kExitUsage;
 }
 
 }  // namespace
 
 int main(int argc, char** argv) {
+  tool::Options options;
   std::string pluginPath = DefaultPluginPath();
-  int i = 1;
-  for (; i < argc && argv[i][0] == '-'; ++i) {
-    if (!std::strcmp(argv[i], "-h") || !std::strcmp(argv[i], "--help")) {
-      std::fputs(kUsage, stdout);
+  bool verbose = false;
+  std::vector<std::string> words;
+  for (int i = 1; i < argc; ++i) {
+    const std::string arg = argv[i];
+    auto value = [&](const char* name) -> const char* {
+      if (i + 1 >= argc) return nullptr;
+      (void)name;
+      return argv[++i];
+    };
+    if (arg == "-h" || arg == "--help") {
+      PrintUsage(stdout);
       return 0;
+    } else if (arg == "--json") {
+      options.json = true;
+    } else if (arg == "--verbose") {
+      verbose = true;
+    } else if (arg == "--plugin" || arg == "--via" || arg == "--intent") {
+      const char* v = value(arg.c_str());
+      if (!v) return Usage(arg + " needs a value");
+      if (arg == "--plugin") pluginPath = v;
+      if (arg == "--via") options.via.push_back(v);
+      if (arg == "--intent") {
+        char* end = nullptr;
+        const long intent = std::strtol(v, &end, 10);
+        if (*v == '\0' || *end != '\0' || intent < 0 || intent > 3) return Usage("--intent takes 0, 1, 2 or 3");
+        options.intent = static_cast<int>(intent);
+      }
+    } else if (arg.size() > 1 && arg[0] == '-' && !(arg[1] >= '0' && arg[1] <= '9') && arg[1] != '.') {
+      return Usage("unknown option " + arg);
+    } else {
+      words.push_back(arg);
     }
-    if (!std::strcmp(argv[i], "--plugin") && i + 1 < argc) {
-      pluginPath = argv[++i];
-      continue;
-    }
-    std::fprintf(stderr, "tintwell: unknown option %s\n%s", argv[i], kUsage);
-    return kExitUsage;
   }
-  if (i >= argc) {
-    std::fputs(kUsage, stderr);
-    return kExitUsage;
-  }
-  const std::string command = argv[i];
-  if (command != "list") {
-    std::fprintf(stderr, "tintwell: unknown command %s\n%s", command.c_str(), kUsage);
-    return kExitUsage;
-  }
+  if (words.empty()) return Usage("no command given");
+  const std::string command = words.front();
+  const std::vector<std::string> args(words.begin() + 1, words.end());
+  if (command != "info" && command != "convert" && command != "gamut" && command != "list")
+    return Usage("unknown command " + command);
+
+  std::unique_ptr<tool::Session> session;
   try {
-    host::Runtime runtime(pluginPath);
-    return List(runtime);
+    session = std::make_unique<tool::Session>(pluginPath, verbose);
+    if (command == "info") return tool::InfoCommand(*session, args, options);
+    if (command == "convert") return tool::ConvertCommand(*session, args, options, stdin);
+    if (command == "gamut") return tool::GamutCommand(*session, args, options);
+    return tool::ListCommand(*session, args, options);
+  } catch (const tool::UsageError& e) {
+    return Usage(e.what());
+  } catch (const tool::JobError& e) {
+    std::fflush(stdout);
+    if (e.code() != 0)
+      std::fprintf(stderr, "tintwell: %s (CMError %d)\n", e.what(), e.code());
+    else
+      std::fprintf(stderr, "tintwell: %s\n", e.what());
+    if (verbose && session)
+      for (const std::string& line : session->TakeTraces()) std::fprintf(stderr, "  trace: %s\n", line.c_str());
+    return kExitFailure;
   } catch (const std::exception& e) {
+    std::fflush(stdout);
     std::fprintf(stderr, "tintwell: %s\n", e.what());
     return kExitFailure;
   }
