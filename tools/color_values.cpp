@@ -8,7 +8,7 @@ namespace tool {
 
 ColorAccess AccessForSpace(const std::string& space) {
   using Kind = ColorAccess::Kind;
-  if (space == "GRAY") return {Kind::Properties, {"gray"}, "gray 0-1"};
+  if (space == "GRAY") return {Kind::Properties, {"gray"}, "gray 0 (white) to 1 (black)"};
   if (space == "XYZ ") return {Kind::Xyz, {"X", "Y", "Z"}, "X Y Z 0-1"};
   if (space == "Yxy ") return {Kind::Properties, {"ycapy", "yx", "yy"}, "Y x y 0-1"};
   if (space == "Lab ") return {Kind::Properties, {"ll", "la", "lb"}, "L 0-100, a b -128-128"};

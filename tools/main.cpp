@@ -34,8 +34,9 @@ void PrintUsage(std::FILE* to) {
   for (const tool::BuiltinProfile& b : tool::BuiltinProfiles()) std::fprintf(to, "  %-8s %s\n", b.name, b.description);
   std::fputs(
       "\n"
-      "Colour values, by the profile's colour space: RGB 0-255; CMYK, gray, XYZ, Yxy,\n"
-      "HSV, HLS 0-1; Lab and Luv L 0-100 with a, b (u, v) -128-128; 5-8 channels 0-255.\n"
+      "Colour values, by the profile's colour space: RGB 0-255; CMYK, XYZ, Yxy, HSV,\n"
+      "HLS 0-1; gray 0 (white) to 1 (black); Lab and Luv L 0-100 with a, b (u, v)\n"
+      "-128-128; 5-8 channels 0-255.\n"
       "\n"
       "Options:\n"
       "  --intent N      rendering intent of source and destination (0 perceptual,\n"

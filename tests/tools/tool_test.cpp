@@ -1,0 +1,97 @@
+// The command-line tool as a user runs it: output, exit status and messages.
+#include <gtest/gtest.h>
+#include <sys/wait.h>
+
+#include <cstdio>
+#include <cstdlib>
+#include <fstream>
+#include <iterator>
+#include <string>
+
+namespace {
+
+struct Result {
+  int status;
+  std::string out, err;
+};
+
+std::string Slurp(const std::string& path) {
+  std::ifstream in(path);
+  return std::string(std::istreambuf_iterator<char>(in), {});
+}
+
+// Runs the tool with args (shell words) and the given standard input.
+Result RunTool(const std::string& args, const std::string& input = "") {
+  const std::string dir = ::testing::TempDir();
+  const std::string in = dir + "tw_in", out = dir + "tw_out", err = dir + "tw_err";
+  std::ofstream(in) << input;
+  const int raw = std::system((std::string("'") + TINTWELL_TOOL + "' " + args + " <" + in + " >" + out + " 2>" + err).c_str());
+  return {WIFEXITED(raw) ? WEXITSTATUS(raw) : -1, Slurp(out), Slurp(err)};
+}
+
+TEST(Tool, HelpAndUsageErrors) {
+  Result r = RunTool("--help");
+  EXPECT_EQ(r.status, 0);
+  EXPECT_NE(r.out.find("usage: tintwell"), std::string::npos);
+  EXPECT_NE(r.out.find("srgb"), std::string::npos);
+  for (const char* bad : {"", "frobnicate", "--bogus info", "convert srgb", "--intent 7 convert srgb lab 1 2 3",
+                          "convert srgb lab 1 2", "convert srgb lab 1 2 x", "gamut srgb 50 0", "list extra"}) {
+    r = RunTool(bad);
+    EXPECT_EQ(r.status, 2) << bad;
+    EXPECT_TRUE(r.out.empty()) << bad;
+    EXPECT_NE(r.err.find("tintwell: "), std::string::npos) << bad;
+  }
+}
+
+TEST(Tool, ConvertsColoursFromArgumentsAndInput) {
+  Result r = RunTool("convert srgb lab 255 255 255 0 0 0");
+  ASSERT_EQ(r.status, 0) << r.err;
+  EXPECT_EQ(r.out, "100 0 0\n0 0 0\n");
+  r = RunTool("convert lab srgb", "50 0 0\n\n100, 0, 0\n");
+  ASSERT_EQ(r.status, 0) << r.err;
+  // L 100 is stored as 65279 of 65280, a hair under white.
+  double red = 0, green = 0, blue = 0;
+  ASSERT_EQ(std::sscanf(r.out.substr(r.out.find('\n') + 1).c_str(), "%lf %lf %lf", &red, &green, &blue), 3);
+  EXPECT_NEAR(red, 255, 0.05);
+  EXPECT_NEAR(green, 255, 0.05);
+  EXPECT_NEAR(blue, 255, 0.05);
+  r = RunTool("--json convert srgb cmyk 255 255 255");
+  ASSERT_EQ(r.status, 0) << r.err;
+  EXPECT_EQ(r.out, "[\n  {\"in\": [255, 255, 255], \"out\": [0, 0, 0, 0]}\n]\n");
+  // Through a profile between, and with another intent: white stays white, which the
+  // gray accessor reads as 0 (it counts darkness).
+  r = RunTool("--via lab --intent 1 convert srgb gray 255 255 255");
+  ASSERT_EQ(r.status, 0) << r.err;
+  EXPECT_EQ(r.out, "0\n");
+}
+
+TEST(Tool, InfoAndGamut) {
+  Result r = RunTool("info");
+  ASSERT_EQ(r.status, 0) << r.err;
+  EXPECT_NE(r.out.find("class              'mntr'"), std::string::npos);
+  EXPECT_NE(r.out.find("valid              yes"), std::string::npos);
+  r = RunTool("--json info lab " TINTWELL_ICC_DIR "/ghostscript/default_cmyk.icc");
+  ASSERT_EQ(r.status, 0) << r.err;
+  EXPECT_NE(r.out.find("\"ColorSpace\": \"Lab \""), std::string::npos);
+  EXPECT_NE(r.out.find("\"ColorSpace\": \"CMYK\""), std::string::npos);
+  EXPECT_EQ(r.out.front(), '[');
+  r = RunTool("gamut srgb 50 0 0");
+  EXPECT_EQ(r.out, "in gamut\n");
+  r = RunTool("--json gamut cmyk 50 80 -80");
+  EXPECT_EQ(r.out, "{\"L\": 50, \"a\": 80, \"b\": -80, \"inGamut\": false}\n");
+}
+
+TEST(Tool, FailedJobsExitOneWithTheReason) {
+  Result r = RunTool("info /nonexistent/x.icc");
+  EXPECT_EQ(r.status, 1);
+  EXPECT_NE(r.err.find("cannot read profile /nonexistent/x.icc"), std::string::npos);
+  // A file that is no profile: the plugin's code and, verbosely, its trace.
+  const std::string junk = ::testing::TempDir() + "junk.icc";
+  std::ofstream(junk) << "not a profile at all";
+  r = RunTool("--verbose convert " + junk + " srgb 1 2 3");
+  EXPECT_EQ(r.status, 1);
+  EXPECT_NE(r.err.find("(CMError 2011)"), std::string::npos) << r.err;
+  EXPECT_NE(r.err.find("trace: PROFILE - FILE CONSTRUCTOR"), std::string::npos) << r.err;
+}
+
+}  // namespace
