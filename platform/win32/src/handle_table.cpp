@@ -28,8 +28,9 @@ std::shared_ptr<void> HandleTable::Take(HANDLE handle, HandleKind kind) {
 }
 
 HandleTable& Handles() {
-  static HandleTable* table = new HandleTable;  // never destroyed: handles may outlive statics
-  return *table;
+  // Destroyed when the library holding it is unloaded, so nothing is left behind.
+  static HandleTable table;
+  return table;
 }
 
 }  // namespace win32
