@@ -1,7 +1,10 @@
 // Colour worlds through the host: building them from profiles, matching CMColor values
 // and checking Lab colours, with the traces and codes a script sees.
+#include <lcms2.h>
+
 #include <cmath>
 
+#include "icm.h"
 #include "plugin_fixture.h"
 #include "profile_files.h"
 
@@ -160,6 +163,121 @@ TEST_F(ColorWorldTest, LinkColorWorldNeedsADeviceLink) {
   EXPECT_EQ(log.entries[log.entries.size() - 2], "DebugString:Error: Not a device link profile");
   rt->Call(w, "LinkColorWorld", {nullptr});
   EXPECT_EQ(Error(), -20);
+}
+
+}  // namespace
+
+namespace {
+
+using host::Object;
+
+// Little CMS called directly in double precision: the independent expectation.
+class LcmsChain {
+ public:
+  // Each profile's intent is its header's unless given.
+  LcmsChain(const std::vector<std::string>& files, cmsUInt32Number in, cmsUInt32Number out,
+            std::vector<cmsUInt32Number> given = {}) {
+    std::vector<cmsHPROFILE> profiles;
+    std::vector<cmsUInt32Number> intents;
+    std::vector<cmsBool> bpc;
+    std::vector<cmsFloat64Number> adaptation;
+    for (const std::string& f : files) {
+      profiles.push_back(cmsOpenProfileFromFile((std::string(TINTWELL_ICC_DIR) + "/" + f).c_str(), "r"));
+      intents.push_back(given.empty() ? cmsGetHeaderRenderingIntent(profiles.back()) : given[intents.size()]);
+      bpc.push_back(FALSE);
+      adaptation.push_back(1.0);
+    }
+    transform_ = cmsCreateExtendedTransform(nullptr, static_cast<cmsUInt32Number>(profiles.size()), profiles.data(),
+                                            bpc.data(), intents.data(), adaptation.data(), nullptr, 0, in, out,
+                                            cmsFLAGS_NOCACHE);
+    for (cmsHPROFILE p : profiles) cmsCloseProfile(p);
+  }
+  ~LcmsChain() {
+    if (transform_) cmsDeleteTransform(transform_);
+  }
+  std::vector<double> Run(std::vector<double> in, std::size_t outChannels) const {
+    std::vector<double> out(outChannels);
+    cmsDoTransform(transform_, in.data(), out.data(), 1);
+    return out;
+  }
+  bool ok() const { return transform_ != nullptr; }
+
+ private:
+  cmsHTRANSFORM transform_ = nullptr;
+};
+
+TEST_F(ColorWorldTest, MatchesLittleCmsInDoublePrecision) {
+  Object srgb = Open("sRGB.icc");
+  Object lab = Open("LCMSLABI.ICM");
+  Object cmyk = Open("ghostscript/default_cmyk.icc");
+  Object toLab = rt->New("ColorWorld", {srgb, lab});
+  Object viaCmyk = rt->New("ColorWorld");
+  // A proof: into the printer's CMYK and back out of it, so the printer appears twice.
+  rt->Call(viaCmyk, "ConcatColorWorld", {0, srgb, cmyk, cmyk, lab});
+  ASSERT_EQ(Error(), 0);
+  const LcmsChain direct({"sRGB.icc", "LCMSLABI.ICM"}, TYPE_RGB_DBL, TYPE_Lab_DBL);
+  const LcmsChain printed(
+      {"sRGB.icc", "ghostscript/default_cmyk.icc", "ghostscript/default_cmyk.icc", "LCMSLABI.ICM"}, TYPE_RGB_DBL,
+      TYPE_Lab_DBL);
+  ASSERT_TRUE(direct.ok() && printed.ok());
+
+  const double colors[][3] = {{255, 255, 255}, {255, 0, 0}, {0, 255, 0}, {0, 0, 255},
+                              {0, 0, 0},       {12, 200, 99}, {180, 30, 250}};
+  for (const auto& c : colors) {
+    for (const auto* chain : {&direct, &printed}) {
+      Object color = Rgb(c[0], c[1], c[2]);
+      rt->Call(chain == &direct ? toLab : viaCmyk, "MatchCMcolor", {color});
+      const auto expected = chain->Run({c[0] / 255, c[1] / 255, c[2] / 255}, 3);
+      // The Lab words hold L to 1/652.8 and a, b to 1/256, truncated on the way in and
+      // rounded on the way out; 0.01 covers both with room to spare.
+      EXPECT_NEAR(D(color, "ll"), expected[0], 0.01) << c[0] << " " << c[1] << " " << c[2];
+      EXPECT_NEAR(D(color, "la"), expected[1], 0.01) << c[0] << " " << c[1] << " " << c[2];
+      EXPECT_NEAR(D(color, "lb"), expected[2], 0.01) << c[0] << " " << c[1] << " " << c[2];
+    }
+  }
+}
+
+TEST_F(ColorWorldTest, RoundTripThroughLabKeepsEightBitLevels) {
+  Object srgb = Open("sRGB.icc");
+  Object lab = Open("LCMSLABI.ICM");
+  Object there = rt->New("ColorWorld", {srgb, lab});
+  Object back = rt->New("ColorWorld", {lab, srgb});
+  for (int r = 0; r <= 255; r += 51)
+    for (int g = 0; g <= 255; g += 51)
+      for (int b = 0; b <= 255; b += 51) {
+        Object color = Rgb(r, g, b);
+        rt->Call(there, "MatchCMcolor", {color});
+        rt->Call(back, "MatchCMcolor", {color});
+        EXPECT_NEAR(D(color, "rr"), r, 1.0) << r << " " << g << " " << b;
+        EXPECT_NEAR(D(color, "rg"), g, 1.0) << r << " " << g << " " << b;
+        EXPECT_NEAR(D(color, "rb"), b, 1.0) << r << " " << g << " " << b;
+      }
+}
+
+TEST_F(ColorWorldTest, EachProfilesIntentReachesTheEngine) {
+  Object srgb = Open("sRGB.icc");
+  Object cmyk = Open("ghostscript/default_cmyk.icc");
+  auto ink = [&](int srcIntent, int dstIntent) {
+    rt->Set(srgb, "RenderIntent", srcIntent);
+    rt->Set(cmyk, "RenderIntent", dstIntent);
+    Object w = rt->New("ColorWorld", {srgb, cmyk});
+    Object c = Rgb(20, 220, 60);
+    rt->Call(w, "MatchCMcolor", {c});
+    return std::vector<double>{D(c, "cc"), D(c, "cm"), D(c, "cy"), D(c, "ck")};
+  };
+  const int cases[][2] = {{INTENT_PERCEPTUAL, INTENT_SATURATION},
+                          {INTENT_PERCEPTUAL, INTENT_ABSOLUTE_COLORIMETRIC},
+                          {INTENT_RELATIVE_COLORIMETRIC, INTENT_RELATIVE_COLORIMETRIC}};
+  std::vector<std::vector<double>> results;
+  for (const auto& c : cases) {
+    const LcmsChain expected({"sRGB.icc", "ghostscript/default_cmyk.icc"}, TYPE_RGB_DBL, TYPE_CMYK_DBL,
+                             {static_cast<cmsUInt32Number>(c[0]), static_cast<cmsUInt32Number>(c[1])});
+    const auto want = expected.Run({20 / 255.0, 220 / 255.0, 60 / 255.0}, 4);
+    const auto got = ink(c[0], c[1]);
+    for (int k = 0; k < 4; ++k) EXPECT_NEAR(got[k], want[k] / 100.0, 1.0 / 65535 + 1e-9) << c[0] << "," << c[1];
+    results.push_back(got);
+  }
+  EXPECT_NE(results[0], results[1]);  // the printer's intent alone changes the result
 }
 
 }  // namespace

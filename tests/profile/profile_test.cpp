@@ -197,6 +197,33 @@ TEST_F(ProfileTest, HeaderPropertiesReadAndWriteTheirFields) {
   EXPECT_EQ(rt->Get(p, "RefCount").AsInteger(), 0);
 }
 
+TEST_F(ProfileTest, HeaderEditsSurviveASaveAndAReopen) {
+  const std::string f = files.Copy("colord/AdobeRGB1998.icc", "a.icc");
+  const struct {
+    const char* property;
+    Value value;
+  } edits[] = {
+      {"Type", "scnr"},       {"CMM", "ABCD"},         {"Platform", "MSFT"}, {"Manufacturer", "TINT"},
+      {"Creator", "twel"},    {"ConnectionSpace", "Lab "}, {"Model", 0x7FFFFFFF}, {"Version", 0x04200000},
+      {"RenderIntent", 2},    {"Quality", 3},          {"Interpolation", false}, {"Matte", true},
+      {"Attribute1", 0xBEEF}, {"WhiteX", 0.5},         {"WhiteY", 0.75},       {"WhiteZ", 1.25},
+      {"Year", 2031},         {"Month", 2},            {"Day", 29},            {"Hour", 1},
+      {"Minute", 2},          {"Second", 3},
+  };
+  {
+    Object p = Open(f);
+    for (const auto& e : edits) rt->Set(p, e.property, e.value);
+    rt->Call(p, "SaveProfile");
+    ASSERT_EQ(Error(), 0);
+  }
+  Object reopened = Open(f);
+  ASSERT_EQ(Error(), 0);
+  for (const auto& e : edits) {
+    const Value v = rt->Get(reopened, e.property);
+    EXPECT_EQ(v.Describe(), e.value.Describe()) << e.property;
+  }
+}
+
 TEST_F(ProfileTest, AnEmptyProfileReportsAsEachPropertySays) {
   Object p = rt->New("Profile", {nullptr});
   Object d = Debugger();
