@@ -48,7 +48,9 @@ TEST_F(ProfileFiles, ChangesReachTheFileAtCloseOnly) {
     if (before[i].signature == Sig("cprt")) std::memcpy(&expected[12], mark, 4);
     EXPECT_EQ(TagBytes(saved, after[i]), expected);
     for (std::size_t j = 0; j < i; ++j) {
-      if (before[j].offset == before[i].offset) EXPECT_EQ(after[j].offset, after[i].offset) << "kept shared";
+      if (before[j].offset == before[i].offset) {
+        EXPECT_EQ(after[j].offset, after[i].offset) << "kept shared";
+      }
     }
   }
   // The header is kept apart from the size field.
