@@ -116,7 +116,7 @@ bool IccContainer::IsShared(std::uint32_t signature) const {
 
 Block& IccContainer::OwnBlock(std::size_t index) {
   std::shared_ptr<Block>& data = tags_[index].data;
-  if (data.use_count() > 1) data = std::make_shared<Block>(*data);
+  if (data.use_count() > 1) data = std::make_shared<Block>(data->data(), data->size());
   return *data;
 }
 
@@ -168,10 +168,10 @@ std::uint64_t IccContainer::SerializedSize() const {
   return AlignUp4(total);
 }
 
-std::vector<std::uint8_t> IccContainer::Serialize() const {
+Bytes IccContainer::Serialize() const {
   const std::uint64_t total = SerializedSize();
   if (total > kMaxFileSize) throw std::bad_alloc();
-  std::vector<std::uint8_t> out(header_.begin(), header_.end());
+  Bytes out(header_.begin(), header_.end());
   out.resize(static_cast<std::size_t>(total), 0);
   WriteBE32(out.data() + kOffsetSize, static_cast<std::uint32_t>(total));
   WriteBE32(out.data() + kHeaderSize, static_cast<std::uint32_t>(tags_.size()));

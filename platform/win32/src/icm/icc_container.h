@@ -39,9 +39,9 @@ class Block {
   Block(std::shared_ptr<const Bytes> source, std::size_t offset, std::size_t size)
       : source_(std::move(source)), view_(source_->data() + offset), size_(size) {}
   explicit Block(std::size_t size) : own_(size), view_(own_.data()), size_(size) {}
-  Block(const Block& other)
-      : source_(other.source_), own_(other.own_), view_(source_ ? other.view_ : own_.data()),
-        size_(other.size_) {}
+  Block(const std::uint8_t* data, std::size_t size)
+      : own_(data, data + size), view_(own_.data()), size_(size) {}
+  Block(const Block&) = delete;
   Block& operator=(const Block&) = delete;
 
   const std::uint8_t* data() const { return view_; }
@@ -99,7 +99,7 @@ class IccContainer {
 
   // The complete file: tag table in order, each distinct data block once, 4-byte
   // aligned with zero padding, size field set to the total.
-  std::vector<std::uint8_t> Serialize() const;
+  Bytes Serialize() const;
 
  private:
   struct Tag {

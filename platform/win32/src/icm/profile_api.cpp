@@ -67,22 +67,21 @@ DWORD OpenFile(const char* name, DWORD creation, OpenProfile& profile) {
   if (!exists && errno != ENOENT) return errno == ENOTDIR ? ERROR_PATH_NOT_FOUND : ErrorFromErrno(errno);
   if (exists && S_ISDIR(st.st_mode)) return ERROR_ACCESS_DENIED;
   if (exists && creation == CREATE_NEW) return ERROR_FILE_EXISTS;
+  if (!exists) {
+    const std::size_t slash = profile.path.rfind('/');
+    const std::string folder = slash == 0 ? "/" : profile.path.substr(0, slash);
+    if (stat(folder.c_str(), &st) != 0 || !S_ISDIR(st.st_mode)) return ERROR_PATH_NOT_FOUND;
+    if (creation == OPEN_EXISTING || creation == TRUNCATE_EXISTING) return ERROR_FILE_NOT_FOUND;
+    if (profile.writable && access(folder.c_str(), W_OK) != 0) return ErrorFromErrno(errno);
+  } else if (profile.writable && access(profile.path.c_str(), W_OK) != 0) {
+    return ErrorFromErrno(errno);
+  }
 
-  const std::size_t slash = profile.path.rfind('/');
-  const std::string folder = slash == 0 ? "/" : profile.path.substr(0, slash);
-  if (profile.writable && access(exists ? profile.path.c_str() : folder.c_str(), W_OK) != 0)
-    return errno == ENOENT ? ERROR_PATH_NOT_FOUND : ErrorFromErrno(errno);
-
-  const bool keepContent = exists && (creation == OPEN_EXISTING || creation == OPEN_ALWAYS);
-  if (keepContent) {
+  if (exists && (creation == OPEN_EXISTING || creation == OPEN_ALWAYS)) {
     auto bytes = std::make_shared<Bytes>();
     code = ReadFileBytes(profile.path, *bytes);
     if (code != ERROR_SUCCESS) return code;
     return IccContainer::Parse(std::move(bytes), profile.icc);
-  }
-  if (!exists && (creation == OPEN_EXISTING || creation == TRUNCATE_EXISTING)) {
-    struct stat folderStat;
-    return stat(folder.c_str(), &folderStat) == 0 ? ERROR_FILE_NOT_FOUND : ERROR_PATH_NOT_FOUND;
   }
   profile.icc = IccContainer::Blank();
   profile.changed = true;
