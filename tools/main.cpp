@@ -76,11 +76,6 @@ int main(int argc, char** argv) {
   std::vector<std::string> words;
   for (int i = 1; i < argc; ++i) {
     const std::string arg = argv[i];
-    auto value = [&](const char* name) -> const char* {
-      if (i + 1 >= argc) return nullptr;
-      (void)name;
-      return argv[++i];
-    };
     if (arg == "-h" || arg == "--help") {
       PrintUsage(stdout);
       return 0;
@@ -89,8 +84,8 @@ int main(int argc, char** argv) {
     } else if (arg == "--verbose") {
       verbose = true;
     } else if (arg == "--plugin" || arg == "--via" || arg == "--intent") {
-      const char* v = value(arg.c_str());
-      if (!v) return Usage(arg + " needs a value");
+      if (i + 1 >= argc) return Usage(arg + " needs a value");
+      const char* v = argv[++i];
       if (arg == "--plugin") pluginPath = v;
       if (arg == "--via") options.via.push_back(v);
       if (arg == "--intent") {
