@@ -98,11 +98,9 @@ DWORD Chain::Build(const HPROFILE* handles, DWORD count, const DWORD* intents, D
   return ERROR_SUCCESS;
 }
 
-cmsHTRANSFORM Chain::Create(cmsUInt32Number in_format, cmsUInt32Number out_format, cmsUInt32Number flags,
-                            size_t count) const {
-  const size_t n = count ? count : profiles_.size();
-  std::vector<cmsHPROFILE> profiles(profiles_.begin(), profiles_.begin() + n);
-  std::vector<cmsUInt32Number> intents(intents_.begin(), intents_.begin() + n);
+cmsHTRANSFORM Chain::Create(cmsUInt32Number in_format, cmsUInt32Number out_format, cmsUInt32Number flags) const {
+  std::vector<cmsHPROFILE> profiles = profiles_;
+  std::vector<cmsUInt32Number> intents = intents_;
   return CreateFrom(profiles, intents, in_format, out_format, flags);
 }
 

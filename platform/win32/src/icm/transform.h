@@ -41,10 +41,9 @@ class Chain {
   // 2011 for bytes Little CMS refuses, 2021 for spaces that do not chain.
   DWORD Build(const HPROFILE* handles, DWORD count, const DWORD* intents, DWORD intent_count);
 
-  // A Little CMS transform over the first `count` profiles (0 = all) with the given
-  // formats; null on failure (LastLcmsError() says why).
-  cmsHTRANSFORM Create(cmsUInt32Number in_format, cmsUInt32Number out_format, cmsUInt32Number flags,
-                       size_t count = 0) const;
+  // A Little CMS transform over the chain with the given formats; null on failure
+  // (CreationError() says why).
+  cmsHTRANSFORM Create(cmsUInt32Number in_format, cmsUInt32Number out_format, cmsUInt32Number flags) const;
   // The first `count` profiles, which must end at the PCS, then on to Lab (double).
   cmsHTRANSFORM CreateToLab(size_t count) const;
 
