@@ -60,7 +60,7 @@ TEST_F(BitmapTest, RefusesBadArguments) {
   } cases[] = {
       {"null source", nullptr, BM_RGBTRIPLETS, 1, 1, 0, dst, BM_RGBTRIPLETS, 0, ERROR_INVALID_PARAMETER},
       {"null destination", src, BM_RGBTRIPLETS, 1, 1, 0, nullptr, BM_RGBTRIPLETS, 0, ERROR_INVALID_PARAMETER},
-      {"unknown format", src, static_cast<BMFORMAT>(0x7777), 1, 1, 0, dst, BM_RGBTRIPLETS, 0,
+      {"unknown format", src, static_cast<BMFORMAT>(0x0777), 1, 1, 0, dst, BM_RGBTRIPLETS, 0,
        ERROR_INVALID_PARAMETER},
       {"16-bit RGB", src, BM_16b_RGB, 1, 1, 0, dst, BM_RGBTRIPLETS, 0, ERROR_NOT_SUPPORTED},
       {"5-5-5 RGB out", src, BM_RGBTRIPLETS, 1, 1, 0, dst, BM_x555RGB, 0, ERROR_NOT_SUPPORTED},
