@@ -1,11 +1,11 @@
 // Profiles on disk: write-back at close, malformed input, validity of every real
 // profile, the colour directory and installing into it.
-#include <dirent.h>
 #include <lcms2.h>
 #include <sys/stat.h>
 
 #include <cstdio>
 #include <cstring>
+#include <filesystem>
 #include <functional>
 
 #include "icc_test_support.h"
@@ -18,8 +18,9 @@ using namespace icctest;
 class ProfileFiles : public TempFolderTest {};
 
 TEST_F(ProfileFiles, ChangesReachTheFileAtCloseOnly) {
-  const Bytes original = ReadBytes(IccPath("sRGB.icc"));
-  const std::string path = CopyOf("sRGB.icc", "edit.icc");
+  // colord's sRGB stores rTRC, gTRC and bTRC once, shared by three entries.
+  const Bytes original = ReadBytes(IccPath("colord/sRGB.icc"));
+  const std::string path = CopyOf("colord/sRGB.icc", "edit.icc");
   HPROFILE h = OpenPath(path, PROFILE_READWRITE, OPEN_EXISTING);
   ASSERT_NE(h, nullptr);
   const std::uint8_t mark[4] = {'M', 'A', 'R', 'K'};
@@ -46,43 +47,39 @@ TEST_F(ProfileFiles, ChangesReachTheFileAtCloseOnly) {
     Bytes expected = TagBytes(original, before[i]);
     if (before[i].signature == Sig("cprt")) std::memcpy(&expected[12], mark, 4);
     EXPECT_EQ(TagBytes(saved, after[i]), expected);
+    for (std::size_t j = 0; j < i; ++j) {
+      if (before[j].offset == before[i].offset) {
+        EXPECT_EQ(after[j].offset, after[i].offset) << "kept shared";
+      }
+    }
   }
   // The header is kept apart from the size field.
   EXPECT_TRUE(std::equal(saved.begin() + 4, saved.begin() + 128, original.begin() + 4));
   // No temporary file is left beside it.
-  int entries = 0;
-  DIR* dir = opendir(root_.c_str());
-  while (dirent* e = readdir(dir)) entries += e->d_name[0] != '.';
-  closedir(dir);
+  const auto entries = std::distance(std::filesystem::directory_iterator(root_), {});
   EXPECT_EQ(entries, 1);
 }
 
 TEST_F(ProfileFiles, ReadOnlyAndUnchangedHandlesNeverWrite) {
-  const Bytes original = ReadBytes(IccPath("Gray.icc"));
   const std::string path = CopyOf("Gray.icc", "g.icc");
-  // Make the file read-only: a read handle must still open, a write handle must not.
   ASSERT_EQ(chmod(Posix("g.icc").c_str(), 0444), 0);
-  if (access(Posix("g.icc").c_str(), W_OK) != 0) {  // not root
+  if (access(Posix("g.icc").c_str(), W_OK) != 0) {  // not running as root
     SetLastError(kSentinel);
     EXPECT_EQ(OpenPath(path, PROFILE_READWRITE, OPEN_EXISTING), nullptr);
     EXPECT_EQ(GetLastError(), ERROR_ACCESS_DENIED);
   }
-  HPROFILE h = OpenPath(path, PROFILE_READ, OPEN_EXISTING);
-  ASSERT_NE(h, nullptr);
-  ASSERT_TRUE(CloseColorProfile(h));
   ASSERT_EQ(chmod(Posix("g.icc").c_str(), 0644), 0);
-
-  struct stat before;
+  struct stat before, after;
   ASSERT_EQ(stat(Posix("g.icc").c_str(), &before), 0);
-  h = OpenPath(path, PROFILE_READWRITE, OPEN_EXISTING);
-  ASSERT_NE(h, nullptr);
-  DWORD count = 0;
-  ASSERT_TRUE(GetCountColorProfileElements(h, &count));
-  ASSERT_TRUE(CloseColorProfile(h));
-  struct stat after;
+  for (DWORD access : {PROFILE_READ, PROFILE_READWRITE}) {
+    HPROFILE h = OpenPath(path, access, OPEN_EXISTING);
+    ASSERT_NE(h, nullptr);
+    DWORD count = 0;
+    ASSERT_TRUE(GetCountColorProfileElements(h, &count));
+    ASSERT_TRUE(CloseColorProfile(h));
+  }
   ASSERT_EQ(stat(Posix("g.icc").c_str(), &after), 0);
   EXPECT_EQ(after.st_ino, before.st_ino) << "an unchanged profile is not rewritten";
-  EXPECT_EQ(ReadBytes(Posix("g.icc")), original);
 }
 
 TEST(MemoryProfiles, NeverTouchTheCallersBuffer) {
@@ -187,30 +184,16 @@ TEST_F(ProfileFiles, TruncatedFiles) {
   CloseColorProfile(h);
 }
 
-void CollectProfiles(const std::string& dir, std::vector<std::string>& out) {
-  DIR* d = opendir(dir.c_str());
-  if (d == nullptr) return;
-  while (dirent* e = readdir(d)) {
-    const std::string name = e->d_name;
-    if (name == "." || name == "..") continue;
-    const std::string path = dir + "/" + name;
-    struct stat st;
-    if (stat(path.c_str(), &st) != 0) continue;
-    if (S_ISDIR(st.st_mode)) {
-      CollectProfiles(path, out);
-    } else if (name.size() > 4) {
-      std::string ext = name.substr(name.size() - 4);
-      for (char& c : ext) c = static_cast<char>(std::tolower(static_cast<unsigned char>(c)));
-      if (ext == ".icc" || ext == ".icm") out.push_back(path);
-    }
-  }
-  closedir(d);
-}
-
 TEST(IsColorProfileValid, EveryRealProfileIsValid) {
   std::vector<std::string> paths;
-  CollectProfiles(TINTWELL_ICC_DIR, paths);
-  CollectProfiles("/usr/share/color/argyll/ref", paths);
+  for (const char* root : {TINTWELL_ICC_DIR, "/usr/share/color/argyll/ref"}) {
+    if (!std::filesystem::is_directory(root)) continue;
+    for (const auto& entry : std::filesystem::recursive_directory_iterator(root)) {
+      std::string ext = entry.path().extension().string();
+      for (char& c : ext) c = static_cast<char>(std::tolower(static_cast<unsigned char>(c)));
+      if (entry.is_regular_file() && (ext == ".icc" || ext == ".icm")) paths.push_back(entry.path().string());
+    }
+  }
   ASSERT_GE(paths.size(), 40u);
   for (const std::string& path : paths) {
     SCOPED_TRACE(path);

@@ -27,8 +27,26 @@ void WriteBE32(std::uint8_t* p, std::uint32_t value) {
   p[3] = static_cast<std::uint8_t>(value);
 }
 
-DWORD IccContainer::Parse(const std::uint8_t* data, std::size_t size, IccContainer& out) {
-  if (data == nullptr || size < kMinProfileSize || size > kMaxFileSize) return ERROR_INVALID_PROFILE;
+std::uint8_t* Block::MutableData() {
+  if (source_) {
+    own_.assign(view_, view_ + size_);
+    source_.reset();
+    view_ = own_.data();
+  }
+  return own_.data();
+}
+
+void Block::Resize(std::size_t size) {
+  MutableData();
+  own_.resize(size, 0);
+  view_ = own_.data();
+  size_ = size;
+}
+
+DWORD IccContainer::Parse(std::shared_ptr<const Bytes> bytes, IccContainer& out) {
+  const std::uint8_t* data = bytes->data();
+  const std::size_t size = bytes->size();
+  if (size < kMinProfileSize || size > kMaxFileSize) return ERROR_INVALID_PROFILE;
   if (ReadBE32(data + kOffsetSignature) != kSignatureAcsp) return ERROR_INVALID_PROFILE;
 
   // Bytes after a smaller declared size are not part of the profile; a larger declared
@@ -63,7 +81,7 @@ DWORD IccContainer::Parse(const std::uint8_t* data, std::size_t size, IccContain
     const std::uint32_t offset = ReadBE32(entry + 4);
     const std::uint32_t length = ReadBE32(entry + 8);
     std::shared_ptr<Block>& block = blocks[(std::uint64_t{offset} << 32) | length];
-    if (!block) block = std::make_shared<Block>(data + offset, data + offset + length);
+    if (!block) block = std::make_shared<Block>(bytes, offset, length);
     result.tags_.push_back(Tag{ReadBE32(entry), block});
   }
   result.RebuildIndex();
@@ -86,7 +104,7 @@ void IccContainer::SetHeader(const std::uint8_t* bytes) {
   std::memcpy(header_.data(), bytes, kHeaderSize);
 }
 
-const IccContainer::Block* IccContainer::Element(std::uint32_t signature) const {
+const Block* IccContainer::Element(std::uint32_t signature) const {
   auto it = index_.find(signature);
   return it == index_.end() ? nullptr : tags_[it->second].data.get();
 }
@@ -96,9 +114,9 @@ bool IccContainer::IsShared(std::uint32_t signature) const {
   return it != index_.end() && tags_[it->second].data.use_count() > 1;
 }
 
-IccContainer::Block& IccContainer::OwnBlock(std::size_t index) {
+Block& IccContainer::OwnBlock(std::size_t index) {
   std::shared_ptr<Block>& data = tags_[index].data;
-  if (data.use_count() > 1) data = std::make_shared<Block>(*data);
+  if (data.use_count() > 1) data = std::make_shared<Block>(data->data(), data->size());
   return *data;
 }
 
@@ -109,8 +127,7 @@ std::size_t IccContainer::WriteElement(std::uint32_t signature, std::size_t offs
   const Block& current = *tags_[it->second].data;
   if (offset >= current.size() || count == 0) return 0;
   const std::size_t n = count < current.size() - offset ? count : current.size() - offset;
-  Block& block = OwnBlock(it->second);
-  std::memcpy(block.data() + offset, data, n);
+  std::memcpy(OwnBlock(it->second).MutableData() + offset, data, n);
   return n;
 }
 
@@ -129,7 +146,7 @@ DWORD IccContainer::ResizeElement(std::uint32_t signature, std::size_t size) {
       tags_.push_back(Tag{signature, std::make_shared<Block>(size)});
       index_[signature] = tags_.size() - 1;
     } else {
-      OwnBlock(it->second).resize(size);
+      OwnBlock(it->second).Resize(size);
     }
   }
   byte_size_ = SerializedSize();
@@ -151,10 +168,10 @@ std::uint64_t IccContainer::SerializedSize() const {
   return AlignUp4(total);
 }
 
-std::vector<std::uint8_t> IccContainer::Serialize() const {
+Bytes IccContainer::Serialize() const {
   const std::uint64_t total = SerializedSize();
   if (total > kMaxFileSize) throw std::bad_alloc();
-  std::vector<std::uint8_t> out(header_.begin(), header_.end());
+  Bytes out(header_.begin(), header_.end());
   out.resize(static_cast<std::size_t>(total), 0);
   WriteBE32(out.data() + kOffsetSize, static_cast<std::uint32_t>(total));
   WriteBE32(out.data() + kHeaderSize, static_cast<std::uint32_t>(tags_.size()));
@@ -167,7 +184,7 @@ std::vector<std::uint8_t> IccContainer::Serialize() const {
     if (placed.second) {
       next = AlignUp4(next);
       placed.first->second = static_cast<std::uint32_t>(next);
-      if (!tag.data->empty()) std::memcpy(out.data() + next, tag.data->data(), tag.data->size());
+      if (tag.data->size() != 0) std::memcpy(out.data() + next, tag.data->data(), tag.data->size());
       next += tag.data->size();
     }
     WriteBE32(entry, tag.signature);

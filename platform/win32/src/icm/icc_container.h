@@ -30,14 +30,41 @@ constexpr std::size_t kOffsetIlluminant = 68;
 std::uint32_t ReadBE32(const std::uint8_t* p);
 void WriteBE32(std::uint8_t* p, std::uint32_t value);
 
+using Bytes = std::vector<std::uint8_t>;
+
+// One element's data: a view into the bytes the profile was parsed from until it is
+// first changed, its own copy from then on.
+class Block {
+ public:
+  Block(std::shared_ptr<const Bytes> source, std::size_t offset, std::size_t size)
+      : source_(std::move(source)), view_(source_->data() + offset), size_(size) {}
+  explicit Block(std::size_t size) : own_(size), view_(own_.data()), size_(size) {}
+  Block(const std::uint8_t* data, std::size_t size)
+      : own_(data, data + size), view_(own_.data()), size_(size) {}
+  Block(const Block&) = delete;
+  Block& operator=(const Block&) = delete;
+
+  const std::uint8_t* data() const { return view_; }
+  std::size_t size() const { return size_; }
+  // Writable bytes; the first call copies a view.
+  std::uint8_t* MutableData();
+  // Truncates or zero-extends.
+  void Resize(std::size_t size);
+
+ private:
+  std::shared_ptr<const Bytes> source_;
+  Bytes own_;
+  const std::uint8_t* view_;
+  std::size_t size_;
+};
+
 class IccContainer {
  public:
-  using Block = std::vector<std::uint8_t>;
-
-  // Parses a profile. Returns ERROR_SUCCESS, or ERROR_INVALID_PROFILE when the bytes
-  // are not a well-formed ICC container (the whole tag table is checked before any
-  // tag data is copied). May throw std::bad_alloc.
-  static DWORD Parse(const std::uint8_t* data, std::size_t size, IccContainer& out);
+  // Parses a profile, keeping the bytes as the elements' backing store. Returns
+  // ERROR_SUCCESS, or ERROR_INVALID_PROFILE when the bytes are not a well-formed ICC
+  // container (the whole tag table is checked before it is used). May throw
+  // std::bad_alloc.
+  static DWORD Parse(std::shared_ptr<const Bytes> bytes, IccContainer& out);
 
   // A profile with a header ('acsp', version 2.1, D50 illuminant) and no tags.
   static IccContainer Blank();
@@ -72,7 +99,7 @@ class IccContainer {
 
   // The complete file: tag table in order, each distinct data block once, 4-byte
   // aligned with zero padding, size field set to the total.
-  std::vector<std::uint8_t> Serialize() const;
+  Bytes Serialize() const;
 
  private:
   struct Tag {

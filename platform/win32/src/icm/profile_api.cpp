@@ -67,22 +67,21 @@ DWORD OpenFile(const char* name, DWORD creation, OpenProfile& profile) {
   if (!exists && errno != ENOENT) return errno == ENOTDIR ? ERROR_PATH_NOT_FOUND : ErrorFromErrno(errno);
   if (exists && S_ISDIR(st.st_mode)) return ERROR_ACCESS_DENIED;
   if (exists && creation == CREATE_NEW) return ERROR_FILE_EXISTS;
-
-  const std::size_t slash = profile.path.rfind('/');
-  const std::string folder = slash == 0 ? "/" : profile.path.substr(0, slash);
-  if (profile.writable && access(exists ? profile.path.c_str() : folder.c_str(), W_OK) != 0)
-    return errno == ENOENT ? ERROR_PATH_NOT_FOUND : ErrorFromErrno(errno);
-
-  const bool keepContent = exists && (creation == OPEN_EXISTING || creation == OPEN_ALWAYS);
-  if (keepContent) {
-    std::vector<std::uint8_t> bytes;
-    code = ReadFileBytes(profile.path, bytes);
-    if (code != ERROR_SUCCESS) return code;
-    return IccContainer::Parse(bytes.data(), bytes.size(), profile.icc);
+  if (!exists) {
+    const std::size_t slash = profile.path.rfind('/');
+    const std::string folder = slash == 0 ? "/" : profile.path.substr(0, slash);
+    if (stat(folder.c_str(), &st) != 0 || !S_ISDIR(st.st_mode)) return ERROR_PATH_NOT_FOUND;
+    if (creation == OPEN_EXISTING || creation == TRUNCATE_EXISTING) return ERROR_FILE_NOT_FOUND;
+    if (profile.writable && access(folder.c_str(), W_OK) != 0) return ErrorFromErrno(errno);
+  } else if (profile.writable && access(profile.path.c_str(), W_OK) != 0) {
+    return ErrorFromErrno(errno);
   }
-  if (!exists && (creation == OPEN_EXISTING || creation == TRUNCATE_EXISTING)) {
-    struct stat folderStat;
-    return stat(folder.c_str(), &folderStat) == 0 ? ERROR_FILE_NOT_FOUND : ERROR_PATH_NOT_FOUND;
+
+  if (exists && (creation == OPEN_EXISTING || creation == OPEN_ALWAYS)) {
+    auto bytes = std::make_shared<Bytes>();
+    code = ReadFileBytes(profile.path, *bytes);
+    if (code != ERROR_SUCCESS) return code;
+    return IccContainer::Parse(std::move(bytes), profile.icc);
   }
   profile.icc = IccContainer::Blank();
   profile.changed = true;
@@ -119,8 +118,8 @@ extern "C" HPROFILE WINAPI OpenColorProfileA(PPROFILE pProfile, DWORD dwDesiredA
     if (pProfile->dwType == PROFILE_FILENAME) {
       code = OpenFile(static_cast<const char*>(pProfile->pProfileData), dwCreationMode, *profile);
     } else if (pProfile->dwType == PROFILE_MEMBUFFER) {
-      code = IccContainer::Parse(static_cast<const std::uint8_t*>(pProfile->pProfileData),
-                                 pProfile->cbDataSize, profile->icc);
+      const auto* data = static_cast<const std::uint8_t*>(pProfile->pProfileData);
+      code = IccContainer::Parse(std::make_shared<Bytes>(data, data + pProfile->cbDataSize), profile->icc);
     } else {
       code = ERROR_INVALID_PARAMETER;
     }
@@ -220,7 +219,7 @@ extern "C" BOOL WINAPI GetColorProfileElement(HPROFILE hProfile, TAGTYPE tag, DW
   auto profile = Lookup(hProfile);
   if (!profile) return Fail(ERROR_INVALID_HANDLE);
   if (pcbElement == nullptr) return Fail(ERROR_INVALID_PARAMETER);
-  const IccContainer::Block* element = profile->icc.Element(tag);
+  const Block* element = profile->icc.Element(tag);
   if (element == nullptr) return Fail(ERROR_TAG_NOT_FOUND);
   if (pElement == nullptr) {
     *pcbElement = static_cast<DWORD>(element->size());
@@ -243,7 +242,7 @@ extern "C" BOOL WINAPI SetColorProfileElement(HPROFILE hProfile, TAGTYPE tag, DW
     if (!profile) return Fail(ERROR_INVALID_HANDLE);
     if (pcbElement == nullptr || pElement == nullptr) return Fail(ERROR_INVALID_PARAMETER);
     if (!profile->writable) return Fail(ERROR_ACCESS_DENIED);
-    const IccContainer::Block* element = profile->icc.Element(tag);
+    const Block* element = profile->icc.Element(tag);
     if (element == nullptr) return Fail(ERROR_TAG_NOT_FOUND);
     if (dwOffset > element->size()) return Fail(ERROR_INVALID_PARAMETER);
     *pcbElement = static_cast<DWORD>(profile->icc.WriteElement(tag, dwOffset, pElement, *pcbElement));

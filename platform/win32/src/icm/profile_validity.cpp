@@ -17,7 +17,7 @@ constexpr std::uint32_t kMatrixShaperTags[] = {
 constexpr std::size_t kMinTagSize = 12;
 
 bool Usable(const IccContainer& profile, std::uint32_t signature) {
-  const IccContainer::Block* block = profile.Element(signature);
+  const Block* block = profile.Element(signature);
   return block != nullptr && block->size() >= kMinTagSize && ReadBE32(block->data()) != 0;
 }
 
