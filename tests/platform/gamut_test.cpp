@@ -2,6 +2,7 @@
 // the gamut of matrix-shaper, gray and CMYK printer profiles.
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cmath>
 #include <random>
 #include <vector>
@@ -102,6 +103,26 @@ TEST_F(GamutTest, DeviceInputEntersTheChain) {
   EXPECT_GT(r[0], 10);
   EXPECT_EQ(r[1], 0);
   EXPECT_EQ(r[2], 0);
+
+  // A named colour is checked as the Lab its entry holds (v2 Lab words, like COLOR_Lab).
+  Profile named("colord/x11-colors.icc");
+  Xform from_names({named.get(), srgb_.get()}, {kRel, kRel});
+  cmsHPROFILE lcms_named = cmsOpenProfileFromFile(IccPath("colord/x11-colors.icc").c_str(), "r");
+  auto* list = static_cast<cmsNAMEDCOLORLIST*>(cmsReadTag(lcms_named, cmsSigNamedColor2Tag));
+  std::vector<COLOR> names(100), labs(100);
+  for (DWORD i = 0; i < names.size(); ++i) {
+    names[i].named.dwIndex = i + 1;
+    ASSERT_TRUE(cmsNamedColorInfo(list, i, nullptr, nullptr, nullptr, &labs[i].Lab.L, nullptr));
+  }
+  cmsCloseProfile(lcms_named);
+  const std::vector<BYTE> by_name = Check(from_names.get(), names, COLOR_NAMED), by_lab = Check(x.get(), labs);
+  for (size_t i = 0; i < names.size(); ++i) EXPECT_NEAR(by_name[i], by_lab[i], 1) << i;
+  EXPECT_GT(std::count(by_name.begin(), by_name.end(), 0), 30);
+  names[50].named.dwIndex = 0;
+  BYTE result[100];
+  SetLastError(kSentinel);
+  EXPECT_FALSE(CheckColors(from_names.get(), names.data(), 100, COLOR_NAMED, result));
+  EXPECT_EQ(GetLastError(), ERROR_INVALID_COLORINDEX);
 }
 
 TEST_F(GamutTest, GrayGamutIsTheNeutralAxis) {

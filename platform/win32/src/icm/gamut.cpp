@@ -191,14 +191,9 @@ extern "C" BOOL WINAPI CheckColors(HTRANSFORM hColorTransform, PCOLOR paInputCol
     const Chain& chain = t->chain();
     // Lab is always measured against the last profile; anything else enters the chain.
     const bool lab_input = ctInput == COLOR_Lab;
-    if (!lab_input && !(chain.named() ? ctInput == COLOR_NAMED : ColorTypeFits(ctInput, chain.input()))) {
-      return Fail(ERROR_COLORSPACE_MISMATCH);
-    }
-    if (!lab_input && chain.named()) {
-      for (DWORD i = 0; i < nColors; ++i) {
-        const DWORD index = paInputColors[i].named.dwIndex;
-        if (index == 0 || index > chain.named_count()) return Fail(ERROR_INVALID_COLORINDEX);
-      }
+    if (!lab_input) {
+      const DWORD error = CheckInput(chain, ctInput, paInputColors, nColors);
+      if (error != ERROR_SUCCESS) return Fail(error);
     }
     DWORD error = ERROR_SUCCESS;
     const GamutCheck* gamut = t->Gamut(error);
@@ -217,7 +212,7 @@ extern "C" BOOL WINAPI CheckColors(HTRANSFORM hColorTransform, PCOLOR paInputCol
       }
       return Succeed();
     }
-    cmsHTRANSFORM to_pcs = t->ToLastPcs(error);
+    cmsHTRANSFORM to_pcs = t->ToLastLab(error);
     if (!to_pcs) return Fail(error);
     const int in_n = chain.named() ? 1 : SpaceChannels(chain.input());
     std::vector<double> in(in_n);

@@ -90,7 +90,7 @@ class Transform {
   // The gamut checker of the last profile, made on first use.
   const GamutCheck* Gamut(DWORD& error);
   // The chain without its last profile, on to Lab (double), made on first use.
-  cmsHTRANSFORM ToLastPcs(DWORD& error);
+  cmsHTRANSFORM ToLastLab(DWORD& error);
 
  private:
   std::unique_ptr<Chain> chain_;
@@ -99,11 +99,15 @@ class Transform {
   std::map<std::pair<cmsUInt32Number, cmsUInt32Number>, cmsHTRANSFORM> bitmaps_;
   std::unique_ptr<GamutCheck> gamut_;
   bool gamut_made_ = false;
-  cmsHTRANSFORM to_last_pcs_ = nullptr;
+  cmsHTRANSFORM to_last_lab_ = nullptr;
 };
 
 // The transform behind a live handle; sets ERROR_INVALID_HANDLE and returns null otherwise.
 std::shared_ptr<Transform> FindTransform(HTRANSFORM handle);
+
+// Whether colours of this type can enter the chain: ERROR_COLORSPACE_MISMATCH when the
+// type does not fit, ERROR_INVALID_COLORINDEX for a named index out of range.
+DWORD CheckInput(const Chain& chain, COLORTYPE type, const COLOR* colors, DWORD count);
 
 // The double format for the chain's input as the colour codecs and named indexes fill it.
 cmsUInt32Number ChainInputFormat(const Chain& chain);
