@@ -17,7 +17,7 @@
 namespace {
 
 constexpr DWORD kSide = 4096;
-const std::string kIccDir = "/usr/share/color/icc/";
+const std::string kIccDir = std::string(TINTWELL_ICC_DIR) + "/";
 
 const std::vector<BYTE>& Image() {
   static const std::vector<BYTE> image = [] {
