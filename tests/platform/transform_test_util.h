@@ -1,5 +1,5 @@
-// Shared helpers of the transform tests: profiles opened through the stand-in and
-// directly in Little CMS, and handles that close themselves.
+// Helpers of the transform tests: profiles opened through the stand-in and directly
+// in Little CMS, and handles that close themselves.
 #ifndef TINTWELL_TESTS_TRANSFORM_TEST_UTIL_H
 #define TINTWELL_TESTS_TRANSFORM_TEST_UTIL_H
 
@@ -15,6 +15,7 @@
 namespace transform_test {
 
 constexpr DWORD kSentinel = 0xDEADBEEF;
+constexpr DWORD kRel = INTENT_RELATIVE_COLORIMETRIC;
 
 inline std::string IccPath(const std::string& name) { return std::string(TINTWELL_ICC_DIR) + "/" + name; }
 
@@ -29,9 +30,7 @@ class Profile {
     PROFILE p{PROFILE_MEMBUFFER, bytes.data(), static_cast<DWORD>(bytes.size())};
     handle_ = OpenColorProfileA(&p, PROFILE_READ, 0, OPEN_EXISTING);
   }
-  ~Profile() {
-    if (handle_) CloseColorProfile(handle_);
-  }
+  ~Profile() { CloseColorProfile(handle_); }
   Profile(const Profile&) = delete;
   Profile& operator=(const Profile&) = delete;
   HPROFILE get() const { return handle_; }
@@ -42,19 +41,16 @@ class Profile {
 
 class Xform {
  public:
-  Xform(std::vector<HPROFILE> profiles, std::vector<DWORD> intents) {
-    handle_ = CreateMultiProfileTransform(profiles.data(), static_cast<DWORD>(profiles.size()), intents.data(),
-                                          static_cast<DWORD>(intents.size()), BEST_MODE, INDEX_DONT_CARE);
-  }
-  ~Xform() {
-    if (handle_) DeleteColorTransform(handle_);
-  }
+  Xform(std::vector<HPROFILE> profiles, std::vector<DWORD> intents)
+      : handle_(CreateMultiProfileTransform(profiles.data(), static_cast<DWORD>(profiles.size()), intents.data(),
+                                            static_cast<DWORD>(intents.size()), BEST_MODE, INDEX_DONT_CARE)) {}
+  ~Xform() { DeleteColorTransform(handle_); }
   Xform(const Xform&) = delete;
   Xform& operator=(const Xform&) = delete;
   HTRANSFORM get() const { return handle_; }
 
  private:
-  HTRANSFORM handle_ = nullptr;
+  HTRANSFORM handle_;
 };
 
 // Little CMS on its own, for independent expectations.
@@ -70,9 +66,7 @@ class LcmsChain {
                                     bpc.data(), intents.data(), adaptation.data(), nullptr, 0, in, out, flags);
     for (cmsHPROFILE p : profiles) cmsCloseProfile(p);
   }
-  ~LcmsChain() {
-    if (x_) cmsDeleteTransform(x_);
-  }
+  ~LcmsChain() { cmsDeleteTransform(x_); }
   LcmsChain(const LcmsChain&) = delete;
   LcmsChain& operator=(const LcmsChain&) = delete;
   cmsHTRANSFORM get() const { return x_; }
@@ -86,7 +80,17 @@ inline std::vector<std::uint8_t> SaveToMemory(cmsHPROFILE profile) {
   cmsSaveProfileToMem(profile, nullptr, &size);
   std::vector<std::uint8_t> bytes(size);
   cmsSaveProfileToMem(profile, bytes.data(), &size);
+  cmsCloseProfile(profile);
   return bytes;
+}
+
+// A device link made by Little CMS applying one curve per channel.
+inline std::vector<std::uint8_t> CurveLink(cmsColorSpaceSignature space, int channels, double gamma) {
+  cmsToneCurve* curve = cmsBuildGamma(nullptr, gamma);
+  std::vector<cmsToneCurve*> curves(channels, curve);
+  cmsHPROFILE link = cmsCreateLinearizationDeviceLink(space, curves.data());
+  cmsFreeToneCurve(curve);
+  return SaveToMemory(link);
 }
 
 }  // namespace transform_test

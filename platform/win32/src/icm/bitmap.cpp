@@ -140,7 +140,7 @@ extern "C" BOOL WINAPI TranslateBitmapBits(HTRANSFORM hColorTransform, PVOID pSr
       return Fail(ERROR_COLORSPACE_MISMATCH);
     }
     if (dwWidth == 0 || dwHeight == 0) return Succeed();
-    // Both extents must be addressable; the product is at most 2^64 - 2^33.
+    // Both extents must be addressable; each is below height * stride < 2^64.
     const uint64_t in_extent = (uint64_t{dwHeight} - 1) * in_stride + uint64_t{dwWidth} * in->bytes;
     const uint64_t out_extent = (uint64_t{dwHeight} - 1) * out_stride + uint64_t{dwWidth} * out->bytes;
     if (in_extent > PTRDIFF_MAX || out_extent > PTRDIFF_MAX) return Fail(ERROR_INVALID_PARAMETER);
@@ -173,6 +173,7 @@ extern "C" BOOL WINAPI TranslateBitmapBits(HTRANSFORM hColorTransform, PVOID pSr
         job.Rows(first, rows);
       } else {
         std::vector<std::thread> pool;
+        pool.reserve(workers);  // no reallocation once threads run
         const size_t share = (rows + workers - 1) / workers;
         for (unsigned w = 1; w < workers; ++w) {
           const size_t begin = std::min(rows, w * share);

@@ -15,10 +15,6 @@ WORD RoundToWord(double v) {
   return static_cast<WORD>(std::lround(v));
 }
 
-bool IsPcs(cmsColorSpaceSignature space) {
-  return space == cmsSigLabData || space == cmsSigXYZData;
-}
-
 void LabToXYZ(const double lab[3], double xyz[3]) {
   const cmsCIELab in{lab[0], lab[1], lab[2]};
   cmsCIEXYZ out;
@@ -42,6 +38,8 @@ const WORD* Words(const COLOR& c) { return &c.gen3ch.ch1; }
 WORD* Words(COLOR& c) { return &c.gen3ch.ch1; }
 
 }  // namespace
+
+bool IsPcsSpace(cmsColorSpaceSignature space) { return space == cmsSigLabData || space == cmsSigXYZData; }
 
 double LabLFromWord(WORD w) { return w * 100.0 / 65280.0; }
 WORD LabLToWord(double l) { return RoundToWord(l * 652.8); }
@@ -114,7 +112,7 @@ bool ColorTypeFits(COLORTYPE type, cmsColorSpaceSignature space) {
     case COLOR_XYZ:
     case COLOR_Yxy:
     case COLOR_Lab:
-      return IsPcs(space);
+      return IsPcsSpace(space);
     case COLOR_3_CHANNEL:
     case COLOR_5_CHANNEL:
     case COLOR_6_CHANNEL:

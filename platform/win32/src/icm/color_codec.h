@@ -28,6 +28,8 @@ BYTE UnitToByte(double v);
 void YxyToXYZ(const double yxy[3], double xyz[3]);
 void XYZToYxy(const double xyz[3], double yxy[3]);
 
+bool IsPcsSpace(cmsColorSpaceSignature space);
+
 // Channels a colour type carries (NAMED carries one index).
 int ColorTypeChannels(COLORTYPE type);
 

@@ -7,12 +7,11 @@
 #include <cstring>
 #include <new>
 
+#include "icm/color_codec.h"
 #include "icm/transform.h"
 
 namespace win32::icm {
 namespace {
-
-bool IsPcs(cmsColorSpaceSignature space) { return space == cmsSigLabData || space == cmsSigXYZData; }
 
 struct LinkParts {
   cmsHTRANSFORM transform = nullptr;
@@ -37,7 +36,7 @@ extern "C" BOOL WINAPI CreateDeviceLinkProfile(PHPROFILE hProfile, DWORD nProfil
     Chain chain;
     DWORD error = chain.Build(hProfile, nProfiles, padwIntent, nIntents);
     if (error != ERROR_SUCCESS) return Fail(error);
-    if (chain.named() || IsPcs(chain.input()) || IsPcs(chain.output())) return Fail(ERROR_INVALID_PROFILE);
+    if (chain.named() || IsPcsSpace(chain.input()) || IsPcsSpace(chain.output())) return Fail(ERROR_INVALID_PROFILE);
 
     LinkParts parts;
     // Formats are left open and nothing is optimised: the link is sampled afresh.

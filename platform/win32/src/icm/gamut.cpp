@@ -109,19 +109,71 @@ BYTE GamutCheck::CheckMatrix(const cmsCIELab& lab) const {
   return Distance(cmsDeltaE(&lab, &back));
 }
 
-BYTE GamutCheck::CheckRoundTrip(const cmsCIELab& lab) const {
+BYTE GamutCheck::CheckRoundTrip(const cmsCIELab& target) const {
   double device[cmsMAXCHANNELS];
-  cmsDoTransform(to_device_, &lab, device, 1);
-  bool in_range = true;
-  for (int c = 0; c < channels_; ++c) {
-    if (!(device[c] >= -1e-6 && device[c] <= 1.0 + 1e-6)) in_range = false;
-    device[c] = std::clamp(device[c], 0.0, 1.0);
+  cmsDoTransform(to_device_, &target, device, 1);
+  for (int c = 0; c < channels_; ++c) device[c] = std::isfinite(device[c]) ? std::clamp(device[c], 0.0, 1.0) : 0.0;
+  cmsCIELab at;
+  cmsDoTransform(to_lab_, device, &at, 1);
+  double err = cmsDeltaE(&target, &at);
+  // Polish the device value with damped Gauss-Newton steps on device -> Lab, kept in
+  // [0, 1]: the output tables only approximate the inverse of the input tables.
+  double damping = 1e-3;
+  for (int iter = 0; iter < kPolishSteps && err > kRoundTripDeltaE; ++iter) {
+    double jac[3][cmsMAXCHANNELS];
+    double trial[cmsMAXCHANNELS];
+    for (int c = 0; c < channels_; ++c) {
+      std::copy(device, device + channels_, trial);
+      // Tables hold 16-bit values: a step much smaller than this may not move the output.
+      const double h = device[c] > 0.5 ? -4e-3 : 4e-3;
+      trial[c] += h;
+      cmsCIELab moved;
+      cmsDoTransform(to_lab_, trial, &moved, 1);
+      jac[0][c] = (moved.L - at.L) / h;
+      jac[1][c] = (moved.a - at.a) / h;
+      jac[2][c] = (moved.b - at.b) / h;
+    }
+    const double r[3] = {target.L - at.L, target.a - at.a, target.b - at.b};
+    // (J^T J + damping * diag) step = J^T r, by Gauss-Jordan elimination.
+    double m[cmsMAXCHANNELS][cmsMAXCHANNELS + 1] = {};
+    const int n = channels_;
+    for (int i = 0; i < n; ++i) {
+      for (int j = 0; j < n; ++j) {
+        for (int k = 0; k < 3; ++k) m[i][j] += jac[k][i] * jac[k][j];
+      }
+      m[i][i] += damping * (1.0 + m[i][i]);
+      for (int k = 0; k < 3; ++k) m[i][n] += jac[k][i] * r[k];
+    }
+    for (int i = 0; i < n; ++i) {
+      int pivot = i;
+      for (int k = i + 1; k < n; ++k) {
+        if (std::fabs(m[k][i]) > std::fabs(m[pivot][i])) pivot = k;
+      }
+      for (int j = 0; j <= n; ++j) std::swap(m[i][j], m[pivot][j]);
+      if (std::fabs(m[i][i]) < 1e-15) continue;
+      for (int k = 0; k < n; ++k) {
+        if (k == i) continue;
+        const double f = m[k][i] / m[i][i];
+        for (int j = i; j <= n; ++j) m[k][j] -= f * m[i][j];
+      }
+    }
+    for (int c = 0; c < n; ++c) {
+      const double step = std::fabs(m[c][c]) < 1e-15 ? 0.0 : m[c][n] / m[c][c];
+      trial[c] = std::clamp(device[c] + step, 0.0, 1.0);
+    }
+    cmsCIELab moved;
+    cmsDoTransform(to_lab_, trial, &moved, 1);
+    const double moved_err = cmsDeltaE(&target, &moved);
+    if (moved_err < err) {
+      std::copy(trial, trial + n, device);
+      at = moved;
+      err = moved_err;
+      damping = std::max(damping * 0.3, 1e-6);
+    } else if ((damping *= 10.0) > 1e6) {
+      break;  // no step helps: a local minimum, which for a colour outside is the boundary
+    }
   }
-  cmsCIELab back;
-  cmsDoTransform(to_lab_, device, &back, 1);
-  const double delta_e = cmsDeltaE(&lab, &back);
-  if (in_range && delta_e <= kRoundTripDeltaE) return 0;
-  return Distance(delta_e);
+  return err <= kRoundTripDeltaE ? 0 : Distance(err);
 }
 
 }  // namespace win32::icm
@@ -139,14 +191,9 @@ extern "C" BOOL WINAPI CheckColors(HTRANSFORM hColorTransform, PCOLOR paInputCol
     const Chain& chain = t->chain();
     // Lab is always measured against the last profile; anything else enters the chain.
     const bool lab_input = ctInput == COLOR_Lab;
-    if (!lab_input && !(chain.named() ? ctInput == COLOR_NAMED : ColorTypeFits(ctInput, chain.input()))) {
-      return Fail(ERROR_COLORSPACE_MISMATCH);
-    }
-    if (!lab_input && chain.named()) {
-      for (DWORD i = 0; i < nColors; ++i) {
-        const DWORD index = paInputColors[i].named.dwIndex;
-        if (index == 0 || index > chain.named_count()) return Fail(ERROR_INVALID_COLORINDEX);
-      }
+    if (!lab_input) {
+      const DWORD error = CheckInput(chain, ctInput, paInputColors, nColors);
+      if (error != ERROR_SUCCESS) return Fail(error);
     }
     DWORD error = ERROR_SUCCESS;
     const GamutCheck* gamut = t->Gamut(error);
@@ -165,7 +212,7 @@ extern "C" BOOL WINAPI CheckColors(HTRANSFORM hColorTransform, PCOLOR paInputCol
       }
       return Succeed();
     }
-    cmsHTRANSFORM to_pcs = t->ToLastPcs(error);
+    cmsHTRANSFORM to_pcs = t->ToLastLab(error);
     if (!to_pcs) return Fail(error);
     const int in_n = chain.named() ? 1 : SpaceChannels(chain.input());
     std::vector<double> in(in_n);

@@ -4,9 +4,12 @@
 // inverse of the colorant matrix; inside when every channel is within [0, 1] give or
 // take kMatrixEpsilon (which absorbs the s15.16 rounding of the colorants and the Lab
 // word steps, so the white point itself counts as inside).
-// Every other device profile is tested by a round trip in double precision,
-// Lab -> device -> Lab with relative colorimetric tables both ways: inside when the
-// device values are within [0, 1] and the colour comes back within kRoundTripDeltaE.
+// Every other device profile is tested by a round trip in double precision with
+// relative colorimetric tables: Lab -> device (output tables) -> Lab (input tables).
+// The output tables only approximate the inverse of the input tables (several dE for
+// some printer profiles), so the device value, kept within [0, 1], is then polished by
+// up to kPolishSteps damped Gauss-Newton steps on device -> Lab. Inside when the colour
+// comes back within kRoundTripDeltaE.
 // The result is 0 inside, otherwise the CIE76 distance to the colour that comes back
 // (the clipped colour for matrix-shapers), rounded, at least 1 and at most 255.
 #ifndef TINTWELL_WIN32_ICM_GAMUT_H
@@ -23,7 +26,8 @@ namespace win32::icm {
 class GamutCheck {
  public:
   static constexpr double kMatrixEpsilon = 2e-4;
-  static constexpr double kRoundTripDeltaE = 3.0;
+  static constexpr double kRoundTripDeltaE = 0.25;
+  static constexpr int kPolishSteps = 60;
 
   // Makes the check for a profile of the given context. A profile without a device
   // gamut (abstract, named, or with a Lab or XYZ data space) gives null: everything

@@ -21,15 +21,11 @@ namespace {
 constexpr DWORD kMaxProfiles = 10;
 constexpr size_t kColorBlock = 256;  // colours converted per Little CMS call
 
-bool IsPcs(cmsColorSpaceSignature space) {
-  return space == cmsSigLabData || space == cmsSigXYZData;
-}
-
 // Spaces one profile may hand to the next: equal, CMYK and '4CLR', or the two PCSs
 // (Little CMS converts between those).
 bool SpacesChain(cmsColorSpaceSignature from, cmsColorSpaceSignature to) {
   if (from == to) return true;
-  if (IsPcs(from) && IsPcs(to)) return true;
+  if (IsPcsSpace(from) && IsPcsSpace(to)) return true;
   const auto cmyk = [](cmsColorSpaceSignature s) { return s == cmsSigCmykData || s == cmsSigMCH4Data; };
   return cmyk(from) && cmyk(to);
 }
@@ -85,7 +81,7 @@ DWORD Chain::Build(const HPROFILE* handles, DWORD count, const DWORD* intents, D
       named_count_ = list ? cmsNamedColorCount(list) : 0;
       if (named_count_ == 0) return ERROR_INVALID_PROFILE;
       step.out = cmsSigLabData;
-    } else if (!forwards && i > 0 && IsPcs(current)) {
+    } else if (!forwards && i > 0 && IsPcsSpace(current)) {
       std::swap(step.in, step.out);
       step.to_pcs = false;
     }
@@ -98,11 +94,9 @@ DWORD Chain::Build(const HPROFILE* handles, DWORD count, const DWORD* intents, D
   return ERROR_SUCCESS;
 }
 
-cmsHTRANSFORM Chain::Create(cmsUInt32Number in_format, cmsUInt32Number out_format, cmsUInt32Number flags,
-                            size_t count) const {
-  const size_t n = count ? count : profiles_.size();
-  std::vector<cmsHPROFILE> profiles(profiles_.begin(), profiles_.begin() + n);
-  std::vector<cmsUInt32Number> intents(intents_.begin(), intents_.begin() + n);
+cmsHTRANSFORM Chain::Create(cmsUInt32Number in_format, cmsUInt32Number out_format, cmsUInt32Number flags) const {
+  std::vector<cmsHPROFILE> profiles = profiles_;
+  std::vector<cmsUInt32Number> intents = intents_;
   return CreateFrom(profiles, intents, in_format, out_format, flags);
 }
 
@@ -132,6 +126,17 @@ cmsHTRANSFORM Chain::CreateFrom(std::vector<cmsHPROFILE>& profiles, std::vector<
                                     flags);
 }
 
+DWORD CheckInput(const Chain& chain, COLORTYPE type, const COLOR* colors, DWORD count) {
+  if (!chain.named()) return ColorTypeFits(type, chain.input()) ? ERROR_SUCCESS : ERROR_COLORSPACE_MISMATCH;
+  if (type != COLOR_NAMED) return ERROR_COLORSPACE_MISMATCH;
+  for (DWORD i = 0; i < count; ++i) {
+    if (colors[i].named.dwIndex == 0 || colors[i].named.dwIndex > chain.named_count()) {
+      return ERROR_INVALID_COLORINDEX;
+    }
+  }
+  return ERROR_SUCCESS;
+}
+
 cmsUInt32Number ChainInputFormat(const Chain& chain) {
   return chain.named() ? TYPE_NAMED_COLOR_INDEX : DoubleFormatFor(chain.input());
 }
@@ -141,7 +146,7 @@ Transform::Transform(std::unique_ptr<Chain> chain) : chain_(std::move(chain)) {}
 Transform::~Transform() {
   if (colors_) cmsDeleteTransform(colors_);
   for (auto& entry : bitmaps_) cmsDeleteTransform(entry.second);
-  if (to_last_pcs_) cmsDeleteTransform(to_last_pcs_);
+  if (to_last_lab_) cmsDeleteTransform(to_last_lab_);
 }
 
 DWORD Transform::Init() {
@@ -174,17 +179,17 @@ const GamutCheck* Transform::Gamut(DWORD& error) {
   return gamut_.get();
 }
 
-cmsHTRANSFORM Transform::ToLastPcs(DWORD& error) {
+cmsHTRANSFORM Transform::ToLastLab(DWORD& error) {
   std::lock_guard<std::mutex> lock(mutex_);
-  if (!to_last_pcs_) {
-    to_last_pcs_ = chain_->CreateToLab(chain_->steps().size() - 1);
-    if (!to_last_pcs_) {
+  if (!to_last_lab_) {
+    to_last_lab_ = chain_->CreateToLab(chain_->steps().size() - 1);
+    if (!to_last_lab_) {
       error = chain_->CreationError();
       return nullptr;
     }
   }
   error = ERROR_SUCCESS;
-  return to_last_pcs_;
+  return to_last_lab_;
 }
 
 std::shared_ptr<Transform> FindTransform(HTRANSFORM handle) {
@@ -244,15 +249,10 @@ extern "C" BOOL WINAPI TranslateColors(HTRANSFORM hColorTransform, PCOLOR paInpu
     if (nColors == 0) return Succeed();
     if (!paInputColors || !paOutputColors) return Fail(ERROR_INVALID_PARAMETER);
     const Chain& chain = t->chain();
-    const bool input_fits = chain.named() ? ctInput == COLOR_NAMED : ColorTypeFits(ctInput, chain.input());
-    if (!input_fits || !ColorTypeFits(ctOutput, chain.output())) return Fail(ERROR_COLORSPACE_MISMATCH);
-    if (chain.named()) {
-      // Refuse before anything is written.
-      for (DWORD i = 0; i < nColors; ++i) {
-        const DWORD index = paInputColors[i].named.dwIndex;
-        if (index == 0 || index > chain.named_count()) return Fail(ERROR_INVALID_COLORINDEX);
-      }
-    }
+    if (!ColorTypeFits(ctOutput, chain.output())) return Fail(ERROR_COLORSPACE_MISMATCH);
+    // Every colour is checked before anything is written.
+    const DWORD error = CheckInput(chain, ctInput, paInputColors, nColors);
+    if (error != ERROR_SUCCESS) return Fail(error);
 
     const int in_n = chain.named() ? 1 : SpaceChannels(chain.input());
     const int out_n = SpaceChannels(chain.output());

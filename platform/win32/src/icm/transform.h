@@ -41,10 +41,9 @@ class Chain {
   // 2011 for bytes Little CMS refuses, 2021 for spaces that do not chain.
   DWORD Build(const HPROFILE* handles, DWORD count, const DWORD* intents, DWORD intent_count);
 
-  // A Little CMS transform over the first `count` profiles (0 = all) with the given
-  // formats; null on failure (LastLcmsError() says why).
-  cmsHTRANSFORM Create(cmsUInt32Number in_format, cmsUInt32Number out_format, cmsUInt32Number flags,
-                       size_t count = 0) const;
+  // A Little CMS transform over the chain with the given formats; null on failure
+  // (CreationError() says why).
+  cmsHTRANSFORM Create(cmsUInt32Number in_format, cmsUInt32Number out_format, cmsUInt32Number flags) const;
   // The first `count` profiles, which must end at the PCS, then on to Lab (double).
   cmsHTRANSFORM CreateToLab(size_t count) const;
 
@@ -91,7 +90,7 @@ class Transform {
   // The gamut checker of the last profile, made on first use.
   const GamutCheck* Gamut(DWORD& error);
   // The chain without its last profile, on to Lab (double), made on first use.
-  cmsHTRANSFORM ToLastPcs(DWORD& error);
+  cmsHTRANSFORM ToLastLab(DWORD& error);
 
  private:
   std::unique_ptr<Chain> chain_;
@@ -100,11 +99,15 @@ class Transform {
   std::map<std::pair<cmsUInt32Number, cmsUInt32Number>, cmsHTRANSFORM> bitmaps_;
   std::unique_ptr<GamutCheck> gamut_;
   bool gamut_made_ = false;
-  cmsHTRANSFORM to_last_pcs_ = nullptr;
+  cmsHTRANSFORM to_last_lab_ = nullptr;
 };
 
 // The transform behind a live handle; sets ERROR_INVALID_HANDLE and returns null otherwise.
 std::shared_ptr<Transform> FindTransform(HTRANSFORM handle);
+
+// Whether colours of this type can enter the chain: ERROR_COLORSPACE_MISMATCH when the
+// type does not fit, ERROR_INVALID_COLORINDEX for a named index out of range.
+DWORD CheckInput(const Chain& chain, COLORTYPE type, const COLOR* colors, DWORD count);
 
 // The double format for the chain's input as the colour codecs and named indexes fill it.
 cmsUInt32Number ChainInputFormat(const Chain& chain);
