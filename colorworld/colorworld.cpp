@@ -2,6 +2,7 @@
 
 #include <cmath>
 
+#include "class_tables.h"
 #include "cmcolor.h"
 #include "debugger.h"
 #include "error_state.h"
@@ -124,8 +125,7 @@ void LinkColorWorld(REALobject self, REALobject link) {
   SetCMError(static_cast<int32_t>(code));
 }
 
-void ConcatColorWorld(REALobject self, int32_t keyindex, REALobject p1, REALobject p2, REALobject p3,
-                      REALobject p4) {
+void ConcatColorWorld(REALobject self, int32_t keyindex, REALobject p1, REALobject p2, REALobject p3, REALobject p4) {
   REALobject const profiles[4] = {p1, p2, p3, p4};
   Concatenate(Data(self), keyindex, profiles, HeaderRead::Reported);
 }
@@ -167,23 +167,18 @@ int32_t GetCMMcount(REALobject, intptr_t) {
   return 1;  // one colour-management module: the platform's
 }
 
-template <class F>
-REALproc P(F f) {
-  return reinterpret_cast<REALproc>(f);
-}
-
 REALproperty properties[] = {
-    {nullptr, "CMMcount", "Integer", 0, P(&GetCMMcount), nullptr, 0, 0, 0, 0},
+    {nullptr, "CMMcount", "Integer", 0, AsProc(&GetCMMcount), nullptr, 0, 0, 0, 0},
 };
 
 REALmethodDefinition methods[] = {
-    {P(&ConstructFromPair), nullptr, "ColorWorld(src as Profile, dest as Profile)"},
-    {P(&ConstructEmpty), nullptr, "ColorWorld()"},
-    {P(&LinkColorWorld), nullptr, "LinkColorWorld(linkprofile as Profile)"},
-    {P(&ConcatColorWorld), nullptr,
+    {AsProc(&ConstructFromPair), nullptr, "ColorWorld(src as Profile, dest as Profile)"},
+    {AsProc(&ConstructEmpty), nullptr, "ColorWorld()"},
+    {AsProc(&LinkColorWorld), nullptr, "LinkColorWorld(linkprofile as Profile)"},
+    {AsProc(&ConcatColorWorld), nullptr,
      "ConcatColorWorld(keyindex as Integer, p1 as Profile, p2 as Profile, p3 as Profile, p4 as Profile)"},
-    {P(&CheckLAB), nullptr, "CheckLAB(L as Double, A as Double, B as Double) as Boolean"},
-    {P(&MatchCMcolor), nullptr, "MatchCMcolor(c as CMcolor)"},
+    {AsProc(&CheckLAB), nullptr, "CheckLAB(L as Double, A as Double, B as Double) as Boolean"},
+    {AsProc(&MatchCMcolor), nullptr, "MatchCMcolor(c as CMcolor)"},
 };
 
 }  // namespace
@@ -220,19 +215,5 @@ REALobject NewConcatColorWorld(int32_t keyindex, REALobject p1, REALobject p2, R
   return world;
 }
 
-REALclassDefinition ColorWorldClass = {
-    REAL_PLUGIN_VERSION,
-    "ColorWorld",
-    nullptr,
-    sizeof(ColorWorldData),
-    0,
-    nullptr,
-    P(&Destruct),
-    properties,
-    sizeof properties / sizeof properties[0],
-    methods,
-    sizeof methods / sizeof methods[0],
-    nullptr,
-    0,
-    0, 0, 0, 0, 0,
-};
+REALclassDefinition ColorWorldClass =
+    ClassDefinition("ColorWorld", sizeof(ColorWorldData), nullptr, AsProc(&Destruct), properties, methods);

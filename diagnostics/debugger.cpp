@@ -2,6 +2,7 @@
 
 #include <cstring>
 
+#include "class_tables.h"
 #include "host_bridge.h"
 #include "instance_data.h"
 #include "temp_folder.h"
@@ -30,13 +31,12 @@ bool GetUseErrorEvent(REALobject self, intptr_t) { return Data(self)->useErrorEv
 void SetUseErrorEvent(REALobject self, intptr_t, bool value) { Data(self)->useErrorEvent = value ? 1 : 0; }
 
 REALproperty debuggerProperties[] = {
-    {nullptr, "UseErrorEvent", "Boolean", 0, reinterpret_cast<REALproc>(&GetUseErrorEvent),
-     reinterpret_cast<REALproc>(&SetUseErrorEvent), 0, 0, 0, 0},
+    {nullptr, "UseErrorEvent", "Boolean", 0, AsProc(&GetUseErrorEvent), AsProc(&SetUseErrorEvent), 0, 0, 0, 0},
 };
 
 REALmethodDefinition debuggerMethods[] = {
-    {reinterpret_cast<REALproc>(&ConstructWithFlag), nullptr, "halvoDebugger(useErrorEvent as boolean)"},
-    {reinterpret_cast<REALproc>(&ConstructDefault), nullptr, "halvoDebugger()"},
+    {AsProc(&ConstructWithFlag), nullptr, "halvoDebugger(useErrorEvent as boolean)"},
+    {AsProc(&ConstructDefault), nullptr, "halvoDebugger()"},
 };
 
 // The handler for one event of the registered debugger, or null.
@@ -56,22 +56,9 @@ void DeliverString(void (*handler)(REALobject, REALstring), const char* text) {
 
 }  // namespace
 
-REALclassDefinition halvoDebuggerClass = {
-    REAL_PLUGIN_VERSION,
-    "halvoDebugger",
-    nullptr,
-    sizeof(DebuggerData),
-    0,
-    nullptr,
-    reinterpret_cast<REALproc>(&Destruct),
-    debuggerProperties,
-    sizeof debuggerProperties / sizeof debuggerProperties[0],
-    debuggerMethods,
-    sizeof debuggerMethods / sizeof debuggerMethods[0],
-    debuggerEvents,
-    sizeof debuggerEvents / sizeof debuggerEvents[0],
-    0, 0, 0, 0, 0,
-};
+REALclassDefinition halvoDebuggerClass =
+    ClassDefinition("halvoDebugger", sizeof(DebuggerData), nullptr, AsProc(&Destruct), debuggerProperties,
+                    debuggerMethods, debuggerEvents, sizeof debuggerEvents / sizeof debuggerEvents[0]);
 
 void SendDebugString(const char* text) {
   if (auto handler = HandlerFor<void (*)(REALobject, REALstring)>(kDebugString)) DeliverString(handler, text);

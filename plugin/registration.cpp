@@ -1,5 +1,6 @@
 #include "registration.h"
 
+#include "class_tables.h"
 #include "cmcolor.h"
 #include "colorworld.h"
 #include "debugger.h"
@@ -20,11 +21,11 @@ REALclassDefinition* const kClasses[] = {
 
 // Global methods in registration order; a method joins this table once it is built.
 REALmethodDefinition globalMethods[] = {
-    {reinterpret_cast<REALproc>(&halvoRegisterDebugger), nullptr, "halvoRegisterDebugger(debugger as halvoDebugger)"},
-    {reinterpret_cast<REALproc>(&halvoUnregisterDebugger), nullptr, "halvoUnregisterDebugger()"},
-    {reinterpret_cast<REALproc>(&CMError), nullptr, "CMError() as Integer"},
-    {reinterpret_cast<REALproc>(&CMErrorMessage), nullptr, "CMErrorMessage() as string"},
-    {reinterpret_cast<REALproc>(&NewConcatColorWorld), nullptr,
+    {AsProc(&halvoRegisterDebugger), nullptr, "halvoRegisterDebugger(debugger as halvoDebugger)"},
+    {AsProc(&halvoUnregisterDebugger), nullptr, "halvoUnregisterDebugger()"},
+    {AsProc(&CMError), nullptr, "CMError() as Integer"},
+    {AsProc(&CMErrorMessage), nullptr, "CMErrorMessage() as string"},
+    {AsProc(&NewConcatColorWorld), nullptr,
      "NewConcatColorWorld(keyindex as Integer, p1 as Profile, p2 as Profile, p3 as Profile, p4 as Profile) as "
      "ColorWorld"},
 };

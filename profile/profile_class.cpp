@@ -1,6 +1,7 @@
 // The Profile class definition: its properties and methods in registration order.
 #include <cstddef>
 
+#include "class_tables.h"
 #include "header_fields.h"
 #include "profile.h"
 
@@ -9,15 +10,10 @@ namespace {
 using namespace header_fields;
 using namespace profile_members;
 
-template <class F>
-REALproc P(F f) {
-  return reinterpret_cast<REALproc>(f);
-}
-
 // A header property: its getter and setter with their no-profile behaviours.
 template <class Field, NoProfile GetPolicy, NoProfile SetPolicy>
 REALproperty Header(const char* name, const char* type) {
-  return {nullptr, name, type, 0, P(&Get<Field, GetPolicy>), P(&Set<Field, SetPolicy>), 0, 0, 0, 0};
+  return {nullptr, name, type, 0, AsProc(&Get<Field, GetPolicy>), AsProc(&Set<Field, SetPolicy>), 0, 0, 0, 0};
 }
 
 template <class Field, NoProfile Policy>
@@ -43,10 +39,10 @@ constexpr NoProfile kSilent = NoProfile::Silent;
 constexpr NoProfile kUntested = NoProfile::NotTested;
 
 REALproperty properties[] = {
-    {nullptr, "Location", "Folderitem", 0, P(&GetLocation), nullptr, 0, 0, 0, 0},
-    {nullptr, "LocationType", "Integer", 0, P(&GetLocationType), nullptr, 0, 0, 0, 0},
-    {nullptr, "Type", "String", 0, P(&GetType),
-     P(&Set<SignatureField<offsetof(PROFILEHEADER, phClass)>, kEvent>), 0, 0, 0, 0},
+    {nullptr, "Location", "Folderitem", 0, AsProc(&GetLocation), nullptr, 0, 0, 0, 0},
+    {nullptr, "LocationType", "Integer", 0, AsProc(&GetLocationType), nullptr, 0, 0, 0, 0},
+    {nullptr, "Type", "String", 0, AsProc(&GetType),
+     AsProc(&Set<SignatureField<offsetof(PROFILEHEADER, phClass)>, kEvent>), 0, 0, 0, 0},
     Header<SignatureField<offsetof(PROFILEHEADER, phCMMType)>, kEvent>("CMM", "String"),
     Header<IntegerField<offsetof(PROFILEHEADER, phRenderingIntent)>, kEvent>("RenderIntent", "Integer"),
     Header<QualityField, kUntested>("Quality", "Integer"),
@@ -58,8 +54,8 @@ REALproperty properties[] = {
     Header<SignatureField<offsetof(PROFILEHEADER, phPlatform)>, kEvent>("Platform", "String"),
     Header<SignatureField<offsetof(PROFILEHEADER, phManufacturer)>, kEvent>("Manufacturer", "String"),
     Header<SignatureField<offsetof(PROFILEHEADER, phCreator)>, kEvent, kUntested>("Creator", "String"),
-    {nullptr, "Signature", "String", 0, P(&Get<SignatureField<offsetof(PROFILEHEADER, phSignature)>, kEvent>),
-     P(&SetSignature), 0, 0, 0, 0},
+    {nullptr, "Signature", "String", 0, AsProc(&Get<SignatureField<offsetof(PROFILEHEADER, phSignature)>, kEvent>),
+     AsProc(&SetSignature), 0, 0, 0, 0},
     Header<IntegerField<offsetof(PROFILEHEADER, phSize)>, kUntested>("Size", "Integer"),
     Header<IntegerField<offsetof(PROFILEHEADER, phVersion)>, kEvent>("Version", "Integer"),
     Header<IntegerField<kFlags>, kEvent>("Flags", "Integer"),
@@ -78,34 +74,21 @@ REALproperty properties[] = {
     Header<DateField<kDate + 4, false>, kUntested>("Hour", "Integer"),
     Header<DateField<kDate + 8, true>, kUntested>("Minute", "Integer"),
     Header<DateField<kDate + 8, false>, kUntested>("Second", "Integer"),
-    {nullptr, "Modified", "Boolean", 0, P(&GetModified), nullptr, 0, 0, 0, 0},
-    {nullptr, "RefCount", "Integer", 0, P(&GetRefCount), nullptr, 0, 0, 0, 0},
+    {nullptr, "Modified", "Boolean", 0, AsProc(&GetModified), nullptr, 0, 0, 0, 0},
+    {nullptr, "RefCount", "Integer", 0, AsProc(&GetRefCount), nullptr, 0, 0, 0, 0},
 };
 
 REALmethodDefinition methods[] = {
-    {P(&ConstructFromFile), nullptr, "Profile(f as Folderitem)"},
-    {P(&ConstructWithIntent), nullptr, "Profile(f as Folderitem, intent as Integer, quality as Integer, CMM as String)"},
-    {P(&ConstructFromProfile), nullptr, "Profile(f as Folderitem, p as Profile)"},
-    {P(&SaveProfileAs), nullptr, "SaveProfileAs(f as folderitem)"},
-    {P(&SaveProfile), nullptr, "SaveProfile()"},
-    {P(&ValidProfile), nullptr, "ValidProfile() as Boolean"},
+    {AsProc(&ConstructFromFile), nullptr, "Profile(f as Folderitem)"},
+    {AsProc(&ConstructWithIntent), nullptr,
+     "Profile(f as Folderitem, intent as Integer, quality as Integer, CMM as String)"},
+    {AsProc(&ConstructFromProfile), nullptr, "Profile(f as Folderitem, p as Profile)"},
+    {AsProc(&SaveProfileAs), nullptr, "SaveProfileAs(f as folderitem)"},
+    {AsProc(&SaveProfile), nullptr, "SaveProfile()"},
+    {AsProc(&ValidProfile), nullptr, "ValidProfile() as Boolean"},
 };
 
 }  // namespace
 
-REALclassDefinition ProfileClass = {
-    REAL_PLUGIN_VERSION,
-    "Profile",
-    nullptr,
-    sizeof(ProfileData),
-    0,
-    nullptr,
-    P(&Destruct),
-    properties,
-    sizeof properties / sizeof properties[0],
-    methods,
-    sizeof methods / sizeof methods[0],
-    nullptr,
-    0,
-    0, 0, 0, 0, 0,
-};
+REALclassDefinition ProfileClass =
+    ClassDefinition("Profile", sizeof(ProfileData), nullptr, AsProc(&Destruct), properties, methods);

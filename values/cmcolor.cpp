@@ -3,6 +3,7 @@
 #include <cmath>
 #include <cstring>
 
+#include "class_tables.h"
 #include "instance_data.h"
 
 namespace {
@@ -128,63 +129,60 @@ void SetAllSix(REALobject self, int32_t n1, int32_t n2, int32_t n3, int32_t n4, 
   for (int i = 0; i < 6; ++i) Bytes(self)[i] = static_cast<uint8_t>(in[i] & 0xFF);
 }
 
-template <class F>
-REALproc P(F f) {
-  return reinterpret_cast<REALproc>(f);
+// A Double property over one word, with the colour type its setter records.
+template <class Conversion, int N, uint8_t Type>
+REALproperty DoubleProperty(const char* name) {
+  return {nullptr, name, "Double", 0, AsProc(&GetWord<Conversion, N>), AsProc(&SetWord<Conversion, N, Type>),
+          0,       0,    0,        0};
 }
 
-#define DOUBLE_PROPERTY(name, conversion, word, type) \
-  {nullptr, name, "Double", 0, P(&GetWord<conversion, word>), P(&SetWord<conversion, word, type>), 0, 0, 0, 0}
-
 REALproperty properties[] = {
-    DOUBLE_PROPERTY("cc", Unit, 0, COLOR_CMYK),
-    DOUBLE_PROPERTY("cm", Unit, 1, COLOR_CMYK),
-    DOUBLE_PROPERTY("cy", Unit, 2, COLOR_CMYK),
-    DOUBLE_PROPERTY("ck", Unit, 3, COLOR_CMYK),
-    DOUBLE_PROPERTY("rr", Rgb, 0, COLOR_RGB),
-    DOUBLE_PROPERTY("rg", Rgb, 1, COLOR_RGB),
-    DOUBLE_PROPERTY("rb", Rgb, 2, COLOR_RGB),
-    {nullptr, "col", "Color", 0, P(&GetCol), P(&SetCol), 0, 0, 0, 0},
-    {nullptr, "namedindex", "Integer", 0, P(&GetNamedIndex), P(&SetNamedIndex), 0, 0, 0, 0},
-    DOUBLE_PROPERTY("ll", LabL, 0, COLOR_Lab),
-    DOUBLE_PROPERTY("la", Signed, 1, COLOR_Lab),
-    DOUBLE_PROPERTY("lb", Signed, 2, COLOR_Lab),
-    DOUBLE_PROPERTY("gray", Gray, 0, COLOR_GRAY),
-    DOUBLE_PROPERTY("hlsh", Unit, 0, COLOR_3_CHANNEL),
-    DOUBLE_PROPERTY("hlsl", Unit, 1, COLOR_3_CHANNEL),
-    DOUBLE_PROPERTY("hlss", Unit, 2, COLOR_3_CHANNEL),
-    DOUBLE_PROPERTY("hsvh", Unit, 0, COLOR_3_CHANNEL),
-    DOUBLE_PROPERTY("hsvs", Unit, 1, COLOR_3_CHANNEL),
-    DOUBLE_PROPERTY("hsvv", Unit, 2, COLOR_3_CHANNEL),
-    DOUBLE_PROPERTY("luvl", LuvL, 0, COLOR_3_CHANNEL),
-    DOUBLE_PROPERTY("luvu", Signed, 1, COLOR_3_CHANNEL),
-    DOUBLE_PROPERTY("luvv", Signed, 2, COLOR_3_CHANNEL),
-    DOUBLE_PROPERTY("ycapy", Unit, 0, COLOR_Yxy),
-    DOUBLE_PROPERTY("yx", Unit, 1, COLOR_Yxy),
-    DOUBLE_PROPERTY("yy", Unit, 2, COLOR_Yxy),
+    DoubleProperty<Unit, 0, COLOR_CMYK>("cc"),
+    DoubleProperty<Unit, 1, COLOR_CMYK>("cm"),
+    DoubleProperty<Unit, 2, COLOR_CMYK>("cy"),
+    DoubleProperty<Unit, 3, COLOR_CMYK>("ck"),
+    DoubleProperty<Rgb, 0, COLOR_RGB>("rr"),
+    DoubleProperty<Rgb, 1, COLOR_RGB>("rg"),
+    DoubleProperty<Rgb, 2, COLOR_RGB>("rb"),
+    {nullptr, "col", "Color", 0, AsProc(&GetCol), AsProc(&SetCol), 0, 0, 0, 0},
+    {nullptr, "namedindex", "Integer", 0, AsProc(&GetNamedIndex), AsProc(&SetNamedIndex), 0, 0, 0, 0},
+    DoubleProperty<LabL, 0, COLOR_Lab>("ll"),
+    DoubleProperty<Signed, 1, COLOR_Lab>("la"),
+    DoubleProperty<Signed, 2, COLOR_Lab>("lb"),
+    DoubleProperty<Gray, 0, COLOR_GRAY>("gray"),
+    DoubleProperty<Unit, 0, COLOR_3_CHANNEL>("hlsh"),
+    DoubleProperty<Unit, 1, COLOR_3_CHANNEL>("hlsl"),
+    DoubleProperty<Unit, 2, COLOR_3_CHANNEL>("hlss"),
+    DoubleProperty<Unit, 0, COLOR_3_CHANNEL>("hsvh"),
+    DoubleProperty<Unit, 1, COLOR_3_CHANNEL>("hsvs"),
+    DoubleProperty<Unit, 2, COLOR_3_CHANNEL>("hsvv"),
+    DoubleProperty<LuvL, 0, COLOR_3_CHANNEL>("luvl"),
+    DoubleProperty<Signed, 1, COLOR_3_CHANNEL>("luvu"),
+    DoubleProperty<Signed, 2, COLOR_3_CHANNEL>("luvv"),
+    DoubleProperty<Unit, 0, COLOR_Yxy>("ycapy"),
+    DoubleProperty<Unit, 1, COLOR_Yxy>("yx"),
+    DoubleProperty<Unit, 2, COLOR_Yxy>("yy"),
 };
 
-#undef DOUBLE_PROPERTY
-
 REALmethodDefinition methods[] = {
-    {P(&ConstructEmpty), nullptr, "CMColor()"},
-    {P(&CopyColor), nullptr, "CMColor(c as CMColor)"},
-    {P(&CopyColor), nullptr, "copy(c as CMColor)"},
-    {P(&GetXYZ), nullptr, "getxyz(byref x as double, byref y as double, byref z as double)"},
-    {P(&SetXYZ), nullptr, "setxyz(x as double, y as double, z as double)"},
-    {P(&Reset), nullptr, "reset()"},
-    {P(&GetChannel<5>), nullptr, "getfive(num as Integer) as Integer"},
-    {P(&SetChannel<5, COLOR_5_CHANNEL>), nullptr, "setfive(num as Integer, value as Integer)"},
-    {P(&GetChannel<6>), nullptr, "getsix(num as Integer) as Integer"},
-    {P(&SetChannel<6, COLOR_6_CHANNEL>), nullptr, "setsix(num as Integer, value as Integer)"},
-    {P(&GetChannel<7>), nullptr, "getseven(num as Integer) as Integer"},
-    {P(&SetChannel<7, COLOR_7_CHANNEL>), nullptr, "setseven(num as Integer, value as Integer)"},
-    {P(&GetChannel<8>), nullptr, "geteight(num as Integer) as Integer"},
-    {P(&SetChannel<8, COLOR_8_CHANNEL>), nullptr, "seteight(num as Integer, value as Integer)"},
-    {P(&GetAllSix), nullptr,
+    {AsProc(&ConstructEmpty), nullptr, "CMColor()"},
+    {AsProc(&CopyColor), nullptr, "CMColor(c as CMColor)"},
+    {AsProc(&CopyColor), nullptr, "copy(c as CMColor)"},
+    {AsProc(&GetXYZ), nullptr, "getxyz(byref x as double, byref y as double, byref z as double)"},
+    {AsProc(&SetXYZ), nullptr, "setxyz(x as double, y as double, z as double)"},
+    {AsProc(&Reset), nullptr, "reset()"},
+    {AsProc(&GetChannel<5>), nullptr, "getfive(num as Integer) as Integer"},
+    {AsProc(&SetChannel<5, COLOR_5_CHANNEL>), nullptr, "setfive(num as Integer, value as Integer)"},
+    {AsProc(&GetChannel<6>), nullptr, "getsix(num as Integer) as Integer"},
+    {AsProc(&SetChannel<6, COLOR_6_CHANNEL>), nullptr, "setsix(num as Integer, value as Integer)"},
+    {AsProc(&GetChannel<7>), nullptr, "getseven(num as Integer) as Integer"},
+    {AsProc(&SetChannel<7, COLOR_7_CHANNEL>), nullptr, "setseven(num as Integer, value as Integer)"},
+    {AsProc(&GetChannel<8>), nullptr, "geteight(num as Integer) as Integer"},
+    {AsProc(&SetChannel<8, COLOR_8_CHANNEL>), nullptr, "seteight(num as Integer, value as Integer)"},
+    {AsProc(&GetAllSix), nullptr,
      "getallsix(byref n1 as integer, byref n2 as integer, byref n3 as integer, byref n4 as integer, "
      "byref n5 as integer, byref n6 as integer)"},
-    {P(&SetAllSix), nullptr,
+    {AsProc(&SetAllSix), nullptr,
      "setallsix(n1 as integer, n2 as integer, n3 as integer, n4 as integer, n5 as integer, n6 as integer)"},
 };
 
@@ -196,19 +194,5 @@ uint16_t StoreRuleWord(double v) {
   return static_cast<uint16_t>(static_cast<uint32_t>(i) & 0xFFFFu);
 }
 
-REALclassDefinition CMColorClass = {
-    REAL_PLUGIN_VERSION,
-    "CMColor",
-    nullptr,
-    sizeof(CMColorData),
-    0,
-    nullptr,
-    nullptr,
-    properties,
-    sizeof properties / sizeof properties[0],
-    methods,
-    sizeof methods / sizeof methods[0],
-    nullptr,
-    0,
-    0, 0, 0, 0, 0,
-};
+REALclassDefinition CMColorClass =
+    ClassDefinition("CMColor", sizeof(CMColorData), nullptr, nullptr, properties, methods);
