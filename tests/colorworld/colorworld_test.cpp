@@ -18,14 +18,6 @@ class ColorWorldTest : public PluginTest {
   Object Open(const std::string& systemRelative) {
     return rt->New("Profile", {rt->MakeFolderItem(std::string(TINTWELL_ICC_DIR) + "/" + systemRelative)});
   }
-  int32_t Error() { return rt->CallGlobal("CMError").AsInteger(); }
-  Object Debugger() {
-    Object d = rt->New("halvoDebugger");
-    log.Attach(*rt, d);
-    rt->CallGlobal("halvoRegisterDebugger", {d});
-    log.entries.clear();
-    return d;
-  }
   Object Rgb(double r, double g, double b) {
     Object c = rt->New("CMColor");
     rt->Set(c, "rr", r);
@@ -35,7 +27,6 @@ class ColorWorldTest : public PluginTest {
   }
   double D(const Object& c, const char* p) { return rt->Get(c, p).AsDouble(); }
   ProfileFiles files;  // keeps the colour directory private
-  EventLog log;
 };
 
 TEST_F(ColorWorldTest, ConvertsSrgbToLabAndCmyk) {

@@ -25,7 +25,6 @@ class InternalsTest : public PluginTest {
     log.entries.clear();
     return d;
   }
-  EventLog log;
 };
 
 TEST_F(InternalsTest, SendersWithoutADebuggerNeverAskForHandlers) {

@@ -12,28 +12,6 @@
 
 #include "host/runtime.h"
 
-class PluginTest : public ::testing::Test {
- protected:
-  explicit PluginTest(std::string pluginPath = TINTWELL_PLUGIN_PATH) : pluginPath_(std::move(pluginPath)) {}
-
-  void SetUp() override { rt = std::make_unique<host::Runtime>(pluginPath_, options); }
-
-  void TearDown() override {
-    // The plugin's own long-lived reference: a registered debugger.
-    rt->CallGlobal("halvoUnregisterDebugger");
-    EXPECT_EQ(rt->LiveObjects(), 0u) << "objects left alive";
-    EXPECT_EQ(rt->LiveStrings(), 0u) << "strings left alive";
-    EXPECT_TRUE(rt->Faults().empty()) << rt->Faults().front();
-    rt.reset();
-  }
-
-  host::Runtime::Options options;
-  std::unique_ptr<host::Runtime> rt;
-
- private:
-  std::string pluginPath_;
-};
-
 // Records every event a debugger raises, in order, as "Name:value".
 class EventLog {
  public:
@@ -56,6 +34,40 @@ class EventLog {
     }
   }
   std::vector<std::string> entries;
+};
+
+class PluginTest : public ::testing::Test {
+ protected:
+  explicit PluginTest(std::string pluginPath = TINTWELL_PLUGIN_PATH) : pluginPath_(std::move(pluginPath)) {}
+
+  void SetUp() override { rt = std::make_unique<host::Runtime>(pluginPath_, options); }
+
+  void TearDown() override {
+    // The plugin's own long-lived reference: a registered debugger.
+    rt->CallGlobal("halvoUnregisterDebugger");
+    EXPECT_EQ(rt->LiveObjects(), 0u) << "objects left alive";
+    EXPECT_EQ(rt->LiveStrings(), 0u) << "strings left alive";
+    EXPECT_TRUE(rt->Faults().empty()) << rt->Faults().front();
+    rt.reset();
+  }
+
+  int32_t Error() { return rt->CallGlobal("CMError").AsInteger(); }
+
+  // Registers a new debugger whose events land in log, past its registration texts.
+  host::Object Debugger() {
+    host::Object d = rt->New("halvoDebugger");
+    log.Attach(*rt, d);
+    rt->CallGlobal("halvoRegisterDebugger", {d});
+    log.entries.clear();
+    return d;
+  }
+
+  host::Runtime::Options options;
+  std::unique_ptr<host::Runtime> rt;
+  EventLog log;
+
+ private:
+  std::string pluginPath_;
 };
 
 #endif

@@ -13,16 +13,7 @@ using host::Value;
 class ProfileTest : public PluginTest {
  protected:
   Object Open(const std::string& path) { return rt->New("Profile", {rt->MakeFolderItem(path)}); }
-  int32_t Error() { return rt->CallGlobal("CMError").AsInteger(); }
-  Object Debugger() {
-    Object d = rt->New("halvoDebugger");
-    log.Attach(*rt, d);
-    rt->CallGlobal("halvoRegisterDebugger", {d});
-    log.entries.clear();
-    return d;
-  }
   ProfileFiles files;
-  EventLog log;
 };
 
 TEST_F(ProfileTest, EachObjectWorksOnItsOwnCopyAndTheLaterSaveWins) {
