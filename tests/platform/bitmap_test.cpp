@@ -211,7 +211,6 @@ TEST_F(BitmapTest, CallbackReportsRowsAndCanCancel) {
   ASSERT_GT(all.seen.size(), 1u);
   EXPECT_EQ(all.seen.back(), h);
   EXPECT_TRUE(std::is_sorted(all.seen.begin(), all.seen.end()));
-
   Progress cancel;
   cancel.stop_after = 1;
   SetLastError(kSentinel);

@@ -62,7 +62,6 @@ TEST(CreateDeviceLinkProfile, IsAVersion2LinkThatConvertsLikeTheChain) {
   ASSERT_GE(size, 132u);
   const std::vector<BYTE> icc(data, data + size);
   EXPECT_WIN32(GlobalFree(data), nullptr, ERROR_SUCCESS);
-
   EXPECT_EQ(icc[8], 0x02);  // major version
   EXPECT_EQ(FourCC(&icc[12]), "link");
   EXPECT_EQ(FourCC(&icc[16]), "RGB ");
@@ -73,7 +72,6 @@ TEST(CreateDeviceLinkProfile, IsAVersion2LinkThatConvertsLikeTheChain) {
   ASSERT_NE(opened, nullptr);
   EXPECT_EQ(cmsGetDeviceClass(opened), cmsSigLinkClass);
   cmsCloseProfile(opened);
-
   // The link alone against the chain. Its 33-point grid resamples the chain: allow
   // 2 % of the range per ink.
   Profile link(icc);

@@ -91,7 +91,6 @@ TEST_F(GamutTest, DeviceInputEntersTheChain) {
   EXPECT_GT(r[0], 10);
   EXPECT_EQ(r[1], 0);
   EXPECT_EQ(r[2], 0);
-
   // A named colour is checked as the Lab its entry holds (v2 Lab words, like COLOR_Lab).
   Profile named("colord/x11-colors.icc");
   Xform from_names({named.get(), srgb_.get()}, {kRel, kRel});

@@ -149,7 +149,6 @@ class TempFolderTest : public ::testing::Test {
     WriteBytes(Posix(as), ReadBytes(IccPath(iccName)));
     return Win(as);
   }
-
   std::string root_;
   std::string colorDir_;
 };

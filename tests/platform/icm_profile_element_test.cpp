@@ -65,7 +65,6 @@ TEST(GetColorProfileElement, Boundaries) {
     EXPECT_EQ(Bytes(buffer, buffer + copied), FileBytes(c.firstFileByte, static_cast<std::uint32_t>(copied)));
     for (std::size_t i = copied; i < sizeof buffer; ++i) ASSERT_EQ(buffer[i], 0xEE) << "wrote past " << copied;
   }
-
   DWORD pcb = 8;
   std::uint8_t buffer[8];
   EXPECT_WIN32(GetColorProfileElement(h, Sig("wtpt"), 0, nullptr, buffer, nullptr), FALSE, ERROR_INVALID_PARAMETER);
@@ -130,7 +129,6 @@ TEST(SetColorProfileElement, WritesInsideTheElementOnly) {
   ASSERT_TRUE(GetColorProfileElement(h, Sig("wtpt"), 0, &pcb, got.data(), nullptr));
   got.resize(pcb);
   EXPECT_EQ(got, expected);
-
   DWORD four = 4;
   EXPECT_WIN32(SetColorProfileElement(h, Sig("wtpt"), 0, nullptr, data), FALSE, ERROR_INVALID_PARAMETER);
   EXPECT_WIN32(SetColorProfileElement(h, Sig("wtpt"), 0, &four, nullptr), FALSE, ERROR_INVALID_PARAMETER);

@@ -28,7 +28,6 @@ TEST_F(ProfileFiles, ChangesReachTheFileAtCloseOnly) {
   ASSERT_TRUE(SetColorProfileElementSize(h, Sig("bkpt"), 20));  // a new tag
   EXPECT_EQ(ReadBytes(Posix("edit.icc")), original) << "unchanged before close";
   EXPECT_WIN32(CloseColorProfile(h), TRUE, ERROR_SUCCESS);
-
   // Re-parse independently: size field, alignment, order, untouched tags byte-exact.
   const Bytes saved = ReadBytes(Posix("edit.icc"));
   ASSERT_NE(saved, original);
@@ -99,7 +98,6 @@ TEST_F(ProfileFiles, SavedProfilesOpenInOtherReaders) {
   ASSERT_TRUE(SetColorProfileElementSize(h, Sig("bkpt"), 0));
   ASSERT_TRUE(SetColorProfileElementSize(h, Sig("cprt"), 27));  // odd size: padding follows
   ASSERT_TRUE(CloseColorProfile(h));
-
   const Bytes saved = ReadBytes(Posix("a98.icc"));
   cmsHPROFILE lcms = cmsOpenProfileFromMem(saved.data(), static_cast<cmsUInt32Number>(saved.size()));
   ASSERT_NE(lcms, nullptr);
@@ -107,7 +105,6 @@ TEST_F(ProfileFiles, SavedProfilesOpenInOtherReaders) {
   EXPECT_NE(cmsReadTag(lcms, cmsSigRedColorantTag), nullptr);
   EXPECT_NE(cmsReadTag(lcms, cmsSigBlueTRCTag), nullptr);
   cmsCloseProfile(lcms);
-
   if (system("command -v iccdump >/dev/null 2>&1") != 0) GTEST_SKIP() << "iccdump is not installed";
   const std::string command = "iccdump -v 3 '" + Posix("a98.icc") + "' >/dev/null 2>&1";
   EXPECT_EQ(system(command.c_str()), 0);
@@ -161,7 +158,6 @@ TEST_F(ProfileFiles, TruncatedFiles) {
   const Bytes srgb = ReadBytes(IccPath("sRGB.icc"));
   WriteBytes(Posix("cut.icc"), Bytes(srgb.begin(), srgb.end() - 8));
   EXPECT_WIN32(OpenPath(Win("cut.icc"), PROFILE_READ, OPEN_EXISTING), nullptr, ERROR_INVALID_PROFILE);
-
   WriteBytes(Posix("pad.icc"), Bytes(srgb.begin(), srgb.end() - 1));
   HPROFILE h = OpenPath(Win("pad.icc"), PROFILE_READ, OPEN_EXISTING);
   BOOL valid = TRUE;
@@ -274,13 +270,11 @@ TEST_F(ColorDirectory, ReportsBytesIncludingTheTerminator) {
   DWORD size = 0;
   EXPECT_WIN32(GetColorDirectoryA(nullptr, nullptr, &size), FALSE, ERROR_INSUFFICIENT_BUFFER);
   EXPECT_EQ(size, needed);
-
   std::string buffer(needed + 8, '#');
   size = needed - 1;
   EXPECT_WIN32(GetColorDirectoryA(nullptr, buffer.data(), &size), FALSE, ERROR_INSUFFICIENT_BUFFER);
   EXPECT_EQ(size, needed);
   EXPECT_EQ(buffer, std::string(needed + 8, '#'));
-
   size = needed;
   EXPECT_WIN32(GetColorDirectoryA(nullptr, buffer.data(), &size), TRUE, ERROR_SUCCESS);
   EXPECT_EQ(size, needed);
@@ -289,7 +283,6 @@ TEST_F(ColorDirectory, ReportsBytesIncludingTheTerminator) {
   EXPECT_EQ(buffer[needed], '#');
   struct stat st;
   EXPECT_EQ(stat(colorDir_.c_str(), &st), 0) << "created when first needed";
-
   EXPECT_WIN32(GetColorDirectoryA("machine", buffer.data(), &size), FALSE, ERROR_INVALID_PARAMETER);
   EXPECT_WIN32(GetColorDirectoryA(nullptr, buffer.data(), nullptr), FALSE, ERROR_INVALID_PARAMETER);
 }
@@ -319,16 +312,13 @@ TEST_F(ColorDirectory, InstallCopiesAndReplaces) {
   EXPECT_WIN32(InstallColorProfileA(nullptr, nullptr), FALSE, ERROR_INVALID_PARAMETER);
   EXPECT_WIN32(InstallColorProfileA(nullptr, Win("missing.icc").c_str()), FALSE, ERROR_FILE_NOT_FOUND);
   EXPECT_WIN32(InstallColorProfileA(nullptr, "D:\\x.icc"), FALSE, ERROR_PATH_NOT_FOUND);
-
   const std::string path = CopyOf("sRGB.icc", "Work 1.icc");
   EXPECT_WIN32(InstallColorProfileA(nullptr, path.c_str()), TRUE, ERROR_SUCCESS);
   EXPECT_EQ(ReadBytes(colorDir_ + "/Work 1.icc"), ReadBytes(IccPath("sRGB.icc")));
-
   // A file of the same name from an earlier run is replaced.
   CopyOf("Gray.icc", "Work 1.icc");
   EXPECT_WIN32(InstallColorProfileA(nullptr, path.c_str()), TRUE, ERROR_SUCCESS);
   EXPECT_EQ(ReadBytes(colorDir_ + "/Work 1.icc"), ReadBytes(IccPath("Gray.icc")));
-
   // Installing the installed copy itself leaves it as it is.
   EXPECT_WIN32(InstallColorProfileA(nullptr, win32::WindowsPathFromPosix(colorDir_ + "/Work 1.icc").c_str()), TRUE, ERROR_SUCCESS);
   EXPECT_EQ(ReadBytes(colorDir_ + "/Work 1.icc"), ReadBytes(IccPath("Gray.icc")));

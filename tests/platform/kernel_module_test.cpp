@@ -32,14 +32,12 @@ TEST(GetModuleFileNameA, NamesTheExecutableAndTruncatesToTheBuffer) {
   const std::string name(full);
   EXPECT_EQ(name.substr(0, 3), "Z:\\");
   EXPECT_EQ(name.substr(name.rfind('\\') + 1), "platform_tests");
-
   char small[8];
   std::memset(small, 'x', sizeof small);
   EXPECT_WIN32(GetModuleFileNameA(nullptr, small, sizeof small), sizeof small, ERROR_INSUFFICIENT_BUFFER);
   EXPECT_EQ(std::string(small), name.substr(0, 7));  // terminated within the buffer
   std::string exact(n, 'x');  // no room for the terminator
   EXPECT_WIN32(GetModuleFileNameA(nullptr, exact.data(), n), n, ERROR_INSUFFICIENT_BUFFER);
-
   char untouched[16] = "untouched";
   EXPECT_WIN32(GetModuleFileNameA(nullptr, untouched, 0), 0u, ERROR_INSUFFICIENT_BUFFER);
   EXPECT_WIN32(GetModuleFileNameA(reinterpret_cast<HMODULE>(0x1234), untouched, 16), 0u, ERROR_INVALID_HANDLE);

@@ -293,7 +293,6 @@ TEST_F(TransformTest, IntentsApplyPerProfile) {
   int differ = 0;  // the intents matter for this chain, so the comparison has teeth
   for (size_t i = 0; i < colors.size(); ++i) differ += std::abs(results[0][i].rgb.red - results[1][i].rgb.red) > 256;
   EXPECT_GT(differ, 30);
-
   // One intent: the first profile gets it, every later one absolute colorimetric.
   Xform one({srgb_.get(), cmyk_.get()}, {INTENT_PERCEPTUAL});
   LcmsChain l({names[0], names[1]}, {INTENT_PERCEPTUAL, INTENT_ABSOLUTE_COLORIMETRIC}, TYPE_RGB_DBL, TYPE_CMYK_DBL);
