@@ -95,26 +95,22 @@ TEST(ColorCodec, ConvertsBetweenThePcsEncodings) {
   EXPECT_EQ(back.Lab.L, 0xFF00);
   EXPECT_EQ(back.Lab.a, 0x8000);
   EXPECT_EQ(back.Lab.b, 0x8000);
-
   COLOR yxy{};
   yxy.Yxy = {0xFFFF, UnitToWord(0.3457), UnitToWord(0.3585)};
   DecodeColor(COLOR_Yxy, yxy, cmsSigLabData, lab);
   EXPECT_NEAR(lab[0], 100.0, 1e-6);
   EXPECT_NEAR(lab[1], 0.0, 0.05);
-
   const double bright[3] = {1.2, 0.5, -0.1};  // XYZ words clip at 1.0
   EncodeColor(COLOR_XYZ, bright, cmsSigXYZData, back);
   EXPECT_EQ(back.XYZ.X, 0xFFFF);
   EXPECT_EQ(back.XYZ.Y, 0x8000);
   EXPECT_EQ(back.XYZ.Z, 0);
-
   COLOR gen{};  // three channels at a Lab end span L 0..100, a and b -128..127
   gen.gen3ch = {0xFFFF, 0, 0xFFFF};
   DecodeColor(COLOR_3_CHANNEL, gen, cmsSigLabData, lab);
   EXPECT_NEAR(lab[0], 100.0, 1e-9);
   EXPECT_NEAR(lab[1], -128.0, 1e-9);
   EXPECT_NEAR(lab[2], 127.0, 1e-9);
-
   COLOR hifi{};
   hifi.hifi.channel[7] = 0x77;
   const double seven[7] = {0, 0.2, 0.4, 0.6, 0.8, 1.0, 0.5};

@@ -45,9 +45,7 @@ TEST(CreateDeviceLinkProfile, RefusesBadArguments) {
   };
   for (size_t i = 0; i < std::size(cases); ++i) {
     SCOPED_TRACE(i);
-    SetLastError(kSentinel);
-    EXPECT_FALSE(CreateDeviceLinkProfile(cases[i].profiles, cases[i].count, intents, 1, 0, cases[i].out, 0));
-    EXPECT_EQ(GetLastError(), cases[i].error);
+    EXPECT_WIN32(CreateDeviceLinkProfile(cases[i].profiles, cases[i].count, intents, 1, 0, cases[i].out, 0), FALSE, cases[i].error);
     if (cases[i].out) {
       EXPECT_EQ(data, nullptr);
     }
@@ -59,16 +57,11 @@ TEST(CreateDeviceLinkProfile, IsAVersion2LinkThatConvertsLikeTheChain) {
   HPROFILE chain[2] = {srgb.get(), cmyk.get()};
   DWORD intents[2] = {INTENT_PERCEPTUAL, INTENT_RELATIVE_COLORIMETRIC};
   BYTE* data = nullptr;
-  SetLastError(kSentinel);
-  ASSERT_TRUE(CreateDeviceLinkProfile(chain, 2, intents, 2, BEST_MODE, &data, INDEX_DONT_CARE));
-  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+  EXPECT_WIN32(CreateDeviceLinkProfile(chain, 2, intents, 2, BEST_MODE, &data, INDEX_DONT_CARE), TRUE, ERROR_SUCCESS);
   const uint32_t size = BigEndian(data);
   ASSERT_GE(size, 132u);
   const std::vector<BYTE> icc(data, data + size);
-  SetLastError(kSentinel);
-  EXPECT_EQ(GlobalFree(data), nullptr);
-  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
-
+  EXPECT_WIN32(GlobalFree(data), nullptr, ERROR_SUCCESS);
   EXPECT_EQ(icc[8], 0x02);  // major version
   EXPECT_EQ(FourCC(&icc[12]), "link");
   EXPECT_EQ(FourCC(&icc[16]), "RGB ");
@@ -79,7 +72,6 @@ TEST(CreateDeviceLinkProfile, IsAVersion2LinkThatConvertsLikeTheChain) {
   ASSERT_NE(opened, nullptr);
   EXPECT_EQ(cmsGetDeviceClass(opened), cmsSigLinkClass);
   cmsCloseProfile(opened);
-
   // The link alone against the chain. Its 33-point grid resamples the chain: allow
   // 2 % of the range per ink.
   Profile link(icc);

@@ -22,7 +22,6 @@ Bytes FileBytes(std::uint32_t from, std::uint32_t count) {
 
 TEST(GetColorProfileElement, Boundaries) {
   HPROFILE h = OpenMemory(SampleProfile(), PROFILE_READ);
-  ASSERT_NE(h, nullptr);
   constexpr DWORD kUntouched = 0xCAFE;
   struct Case {
     const char* what;
@@ -66,59 +65,40 @@ TEST(GetColorProfileElement, Boundaries) {
     EXPECT_EQ(Bytes(buffer, buffer + copied), FileBytes(c.firstFileByte, static_cast<std::uint32_t>(copied)));
     for (std::size_t i = copied; i < sizeof buffer; ++i) ASSERT_EQ(buffer[i], 0xEE) << "wrote past " << copied;
   }
-
   DWORD pcb = 8;
   std::uint8_t buffer[8];
-  SetLastError(kSentinel);
-  EXPECT_FALSE(GetColorProfileElement(h, Sig("wtpt"), 0, nullptr, buffer, nullptr));
-  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
-  SetLastError(kSentinel);
-  EXPECT_TRUE(GetColorProfileElement(h, Sig("wtpt"), 0, &pcb, buffer, nullptr));  // reference is optional
-  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+  EXPECT_WIN32(GetColorProfileElement(h, Sig("wtpt"), 0, nullptr, buffer, nullptr), FALSE, ERROR_INVALID_PARAMETER);
+  EXPECT_WIN32(GetColorProfileElement(h, Sig("wtpt"), 0, &pcb, buffer, nullptr), TRUE, ERROR_SUCCESS);  // no reference
   EXPECT_TRUE(CloseColorProfile(h));
 }
 
 TEST(ColorProfileTags, IndexAndPresence) {
   HPROFILE h = OpenMemory(SampleProfile(), PROFILE_READ);
-  ASSERT_NE(h, nullptr);
-  SetLastError(kSentinel);
-  EXPECT_FALSE(GetCountColorProfileElements(h, nullptr));
-  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
-
+  EXPECT_WIN32(GetCountColorProfileElements(h, nullptr), FALSE, ERROR_INVALID_PARAMETER);
   for (DWORD bad : {0u, 4u, 0xFFFFFFFFu}) {
     TAGTYPE tag = 0x1234;
-    SetLastError(kSentinel);
-    EXPECT_FALSE(GetColorProfileElementTag(h, bad, &tag));
-    EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
+    EXPECT_WIN32(GetColorProfileElementTag(h, bad, &tag), FALSE, ERROR_INVALID_PARAMETER);
     EXPECT_EQ(tag, 0x1234u) << "left untouched";
   }
-  SetLastError(kSentinel);
-  EXPECT_FALSE(GetColorProfileElementTag(h, 1, nullptr));
-  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
+  EXPECT_WIN32(GetColorProfileElementTag(h, 1, nullptr), FALSE, ERROR_INVALID_PARAMETER);
   TAGTYPE last = 0;
   EXPECT_TRUE(GetColorProfileElementTag(h, 3, &last));
   EXPECT_EQ(last, Sig("gTRC"));
-
   struct {
     TAGTYPE tag;
     BOOL present;
   } presence[] = {{Sig("wtpt"), TRUE}, {Sig("gTRC"), TRUE}, {Sig("cprt"), FALSE}, {0, FALSE}};
   for (const auto& p : presence) {
     BOOL present = 7;
-    SetLastError(kSentinel);
-    EXPECT_TRUE(IsColorProfileTagPresent(h, p.tag, &present));
-    EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+    EXPECT_WIN32(IsColorProfileTagPresent(h, p.tag, &present), TRUE, ERROR_SUCCESS);
     EXPECT_EQ(present, p.present) << std::hex << p.tag;
   }
-  SetLastError(kSentinel);
-  EXPECT_FALSE(IsColorProfileTagPresent(h, Sig("wtpt"), nullptr));
-  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
+  EXPECT_WIN32(IsColorProfileTagPresent(h, Sig("wtpt"), nullptr), FALSE, ERROR_INVALID_PARAMETER);
   EXPECT_TRUE(CloseColorProfile(h));
 }
 
 TEST(SetColorProfileElement, WritesInsideTheElementOnly) {
   HPROFILE h = OpenMemory(SampleProfile());
-  ASSERT_NE(h, nullptr);
   std::uint8_t data[64];
   for (int i = 0; i < 64; ++i) data[i] = static_cast<std::uint8_t>(0x80 + i);
   struct Case {
@@ -137,9 +117,7 @@ TEST(SetColorProfileElement, WritesInsideTheElementOnly) {
   for (const Case& c : cases) {
     SCOPED_TRACE(c.what);
     DWORD pcb = c.pcb;
-    SetLastError(kSentinel);
-    EXPECT_EQ(SetColorProfileElement(h, c.tag, c.offset, &pcb, data), c.result);
-    EXPECT_EQ(GetLastError(), c.error);
+    EXPECT_WIN32(SetColorProfileElement(h, c.tag, c.offset, &pcb, data), c.result, c.error);
     EXPECT_EQ(pcb, c.pcbAfter);
   }
   // wtpt: bytes 0-1 original, 2-5 = data[0..3], 6-11 original, 12-19 = data[0..7].
@@ -151,36 +129,9 @@ TEST(SetColorProfileElement, WritesInsideTheElementOnly) {
   ASSERT_TRUE(GetColorProfileElement(h, Sig("wtpt"), 0, &pcb, got.data(), nullptr));
   got.resize(pcb);
   EXPECT_EQ(got, expected);
-
   DWORD four = 4;
-  SetLastError(kSentinel);
-  EXPECT_FALSE(SetColorProfileElement(h, Sig("wtpt"), 0, nullptr, data));
-  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
-  SetLastError(kSentinel);
-  EXPECT_FALSE(SetColorProfileElement(h, Sig("wtpt"), 0, &four, nullptr));
-  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
-  EXPECT_TRUE(CloseColorProfile(h));
-}
-
-TEST(ElementWrites, ReadOnlyHandlesRefuseEveryChange) {
-  HPROFILE h = OpenMemory(SampleProfile(), PROFILE_READ);
-  ASSERT_NE(h, nullptr);
-  std::uint8_t data[4] = {1, 2, 3, 4};
-  DWORD pcb = 4;
-  SetLastError(kSentinel);
-  EXPECT_FALSE(SetColorProfileElement(h, Sig("wtpt"), 0, &pcb, data));
-  EXPECT_EQ(GetLastError(), ERROR_ACCESS_DENIED);
-  for (DWORD size : {0u, 8u, 40u}) {
-    SetLastError(kSentinel);
-    EXPECT_FALSE(SetColorProfileElementSize(h, Sig("wtpt"), size));
-    EXPECT_EQ(GetLastError(), ERROR_ACCESS_DENIED);
-  }
-  SetLastError(kSentinel);
-  EXPECT_FALSE(SetColorProfileElementSize(h, Sig("cprt"), 8));
-  EXPECT_EQ(GetLastError(), ERROR_ACCESS_DENIED);
-  DWORD size = 0;
-  GetColorProfileElement(h, Sig("wtpt"), 0, &size, nullptr, nullptr);
-  EXPECT_EQ(size, 20u);
+  EXPECT_WIN32(SetColorProfileElement(h, Sig("wtpt"), 0, nullptr, data), FALSE, ERROR_INVALID_PARAMETER);
+  EXPECT_WIN32(SetColorProfileElement(h, Sig("wtpt"), 0, &four, nullptr), FALSE, ERROR_INVALID_PARAMETER);
   EXPECT_TRUE(CloseColorProfile(h));
 }
 
@@ -197,49 +148,36 @@ Bytes Element(HPROFILE h, TAGTYPE tag) {
   return b;
 }
 
+TEST(ElementWrites, ReadOnlyHandlesRefuseEveryChange) {
+  HPROFILE h = OpenMemory(SampleProfile(), PROFILE_READ);
+  std::uint8_t data[4] = {1, 2, 3, 4};
+  DWORD pcb = 4;
+  EXPECT_WIN32(SetColorProfileElement(h, Sig("wtpt"), 0, &pcb, data), FALSE, ERROR_ACCESS_DENIED);
+  for (TAGTYPE tag : {Sig("wtpt"), Sig("cprt")})
+    for (DWORD size : {0u, 8u, 40u}) EXPECT_WIN32(SetColorProfileElementSize(h, tag, size), FALSE, ERROR_ACCESS_DENIED);
+  EXPECT_EQ(Element(h, Sig("wtpt")), FileBytes(168, 20));
+  EXPECT_TRUE(CloseColorProfile(h));
+}
+
 TEST(SetColorProfileElementSize, GrowShrinkRemoveCreate) {
   HPROFILE h = OpenMemory(SampleProfile());
-  ASSERT_NE(h, nullptr);
-
-  SetLastError(kSentinel);
-  ASSERT_TRUE(SetColorProfileElementSize(h, Sig("wtpt"), 30));
-  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+  EXPECT_WIN32(SetColorProfileElementSize(h, Sig("wtpt"), 30), TRUE, ERROR_SUCCESS);
   Bytes grown = FileBytes(168, 20);
   grown.resize(30, 0);
   EXPECT_EQ(Element(h, Sig("wtpt")), grown);
-
   ASSERT_TRUE(SetColorProfileElementSize(h, Sig("wtpt"), 8));
   EXPECT_EQ(Element(h, Sig("wtpt")), FileBytes(168, 8));
-
-  SetLastError(kSentinel);
-  ASSERT_TRUE(SetColorProfileElementSize(h, Sig("wtpt"), 0));
-  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
-  DWORD count = 0;
-  ASSERT_TRUE(GetCountColorProfileElements(h, &count));
-  EXPECT_EQ(count, 2u);
+  EXPECT_WIN32(SetColorProfileElementSize(h, Sig("wtpt"), 0), TRUE, ERROR_SUCCESS);
+  EXPECT_EQ(TagList(h), (std::vector<TAGTYPE>{Sig("rTRC"), Sig("gTRC")}));
   BOOL present = TRUE;
   ASSERT_TRUE(IsColorProfileTagPresent(h, Sig("wtpt"), &present));
   EXPECT_FALSE(present);
-  TAGTYPE first = 0;
-  ASSERT_TRUE(GetColorProfileElementTag(h, 1, &first));
-  EXPECT_EQ(first, Sig("rTRC"));
-  SetLastError(kSentinel);
-  EXPECT_FALSE(SetColorProfileElementSize(h, Sig("wtpt"), 0));
-  EXPECT_EQ(GetLastError(), ERROR_TAG_NOT_FOUND);
-  SetLastError(kSentinel);
-  EXPECT_FALSE(SetColorProfileElementSize(h, 0, 8));
-  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
-
+  EXPECT_WIN32(SetColorProfileElementSize(h, Sig("wtpt"), 0), FALSE, ERROR_TAG_NOT_FOUND);
+  EXPECT_WIN32(SetColorProfileElementSize(h, 0, 8), FALSE, ERROR_INVALID_PARAMETER);
   // Create, then fill: a new element is zero-filled and goes to the end of the table.
-  SetLastError(kSentinel);
-  ASSERT_TRUE(SetColorProfileElementSize(h, Sig("cprt"), 12));
-  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+  EXPECT_WIN32(SetColorProfileElementSize(h, Sig("cprt"), 12), TRUE, ERROR_SUCCESS);
   EXPECT_EQ(Element(h, Sig("cprt")), Bytes(12, 0));
-  ASSERT_TRUE(GetCountColorProfileElements(h, &count));
-  EXPECT_EQ(count, 3u);
-  TAGTYPE last = 0;
-  ASSERT_TRUE(GetColorProfileElementTag(h, 3, &last));
-  EXPECT_EQ(last, Sig("cprt"));
+  EXPECT_EQ(TagList(h), (std::vector<TAGTYPE>{Sig("rTRC"), Sig("gTRC"), Sig("cprt")}));
   const Bytes text = {'t', 'e', 'x', 't', 0, 0, 0, 0, 'a', 'b', 'c', 0};
   DWORD n = 12;
   ASSERT_TRUE(SetColorProfileElement(h, Sig("cprt"), 0, &n, const_cast<std::uint8_t*>(text.data())));
@@ -251,7 +189,6 @@ TEST(SharedElements, ResizeOrRewriteGivesAnOwnCopy) {
   for (bool resize : {true, false}) {
     SCOPED_TRACE(resize ? "resize" : "rewrite");
     HPROFILE h = OpenMemory(SampleProfile());
-    ASSERT_NE(h, nullptr);
     if (resize) {
       ASSERT_TRUE(SetColorProfileElementSize(h, Sig("gTRC"), 18));
     } else {
@@ -281,12 +218,10 @@ TEST(SerializeProfile, LaysOutAlignedSharedData) {
                               {Sig("desc"), 213, 5}},
                              40);  // unaligned on purpose
   HPROFILE h = OpenMemory(source);
-  ASSERT_NE(h, nullptr);
   ASSERT_TRUE(SetColorProfileElementSize(h, Sig("desc"), 7));
   std::vector<std::uint8_t> saved;
   ASSERT_TRUE(win32::icm::SerializeProfile(h, saved));
   EXPECT_TRUE(CloseColorProfile(h));
-
   ASSERT_GE(saved.size(), 132u);
   EXPECT_EQ(BE32(saved, 0), saved.size());
   EXPECT_EQ(saved.size() % 4, 0u);
@@ -305,8 +240,7 @@ TEST(SerializeProfile, LaysOutAlignedSharedData) {
   Bytes desc = FileBytes(213, 5);
   desc.resize(7, 0);
   EXPECT_EQ(TagBytes(saved, table[3]), desc);
-  // Padding between blocks is zero.
-  EXPECT_EQ(saved[table[0].offset + 19], 0);
+  EXPECT_EQ(saved[table[0].offset + 19], 0);  // zero padding
 }
 
 }  // namespace

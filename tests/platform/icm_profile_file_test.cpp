@@ -22,16 +22,12 @@ TEST_F(ProfileFiles, ChangesReachTheFileAtCloseOnly) {
   const Bytes original = ReadBytes(IccPath("colord/sRGB.icc"));
   const std::string path = CopyOf("colord/sRGB.icc", "edit.icc");
   HPROFILE h = OpenPath(path, PROFILE_READWRITE, OPEN_EXISTING);
-  ASSERT_NE(h, nullptr);
   const std::uint8_t mark[4] = {'M', 'A', 'R', 'K'};
   DWORD n = 4;
   ASSERT_TRUE(SetColorProfileElement(h, Sig("cprt"), 12, &n, const_cast<std::uint8_t*>(mark)));
   ASSERT_TRUE(SetColorProfileElementSize(h, Sig("bkpt"), 20));  // a new tag
   EXPECT_EQ(ReadBytes(Posix("edit.icc")), original) << "unchanged before close";
-  SetLastError(kSentinel);
-  ASSERT_TRUE(CloseColorProfile(h));
-  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
-
+  EXPECT_WIN32(CloseColorProfile(h), TRUE, ERROR_SUCCESS);
   // Re-parse independently: size field, alignment, order, untouched tags byte-exact.
   const Bytes saved = ReadBytes(Posix("edit.icc"));
   ASSERT_NE(saved, original);
@@ -64,9 +60,7 @@ TEST_F(ProfileFiles, ReadOnlyAndUnchangedHandlesNeverWrite) {
   const std::string path = CopyOf("Gray.icc", "g.icc");
   ASSERT_EQ(chmod(Posix("g.icc").c_str(), 0444), 0);
   if (access(Posix("g.icc").c_str(), W_OK) != 0) {  // not running as root
-    SetLastError(kSentinel);
-    EXPECT_EQ(OpenPath(path, PROFILE_READWRITE, OPEN_EXISTING), nullptr);
-    EXPECT_EQ(GetLastError(), ERROR_ACCESS_DENIED);
+    EXPECT_WIN32(OpenPath(path, PROFILE_READWRITE, OPEN_EXISTING), nullptr, ERROR_ACCESS_DENIED);
   }
   ASSERT_EQ(chmod(Posix("g.icc").c_str(), 0644), 0);
   struct stat before, after;
@@ -86,7 +80,6 @@ TEST(MemoryProfiles, NeverTouchTheCallersBuffer) {
   Bytes buffer = ReadBytes(IccPath("sRGB.icc"));
   const Bytes copy = buffer;
   HPROFILE h = OpenMemory(buffer);
-  ASSERT_NE(h, nullptr);
   std::uint8_t zeros[8] = {};
   DWORD n = 8;
   ASSERT_TRUE(SetColorProfileElement(h, Sig("wtpt"), 0, &n, zeros));
@@ -102,11 +95,9 @@ TEST(MemoryProfiles, NeverTouchTheCallersBuffer) {
 TEST_F(ProfileFiles, SavedProfilesOpenInOtherReaders) {
   const std::string path = CopyOf("compatibleWithAdobeRGB1998.icc", "a98.icc");
   HPROFILE h = OpenPath(path, PROFILE_READWRITE, OPEN_EXISTING);
-  ASSERT_NE(h, nullptr);
   ASSERT_TRUE(SetColorProfileElementSize(h, Sig("bkpt"), 0));
   ASSERT_TRUE(SetColorProfileElementSize(h, Sig("cprt"), 27));  // odd size: padding follows
   ASSERT_TRUE(CloseColorProfile(h));
-
   const Bytes saved = ReadBytes(Posix("a98.icc"));
   cmsHPROFILE lcms = cmsOpenProfileFromMem(saved.data(), static_cast<cmsUInt32Number>(saved.size()));
   ASSERT_NE(lcms, nullptr);
@@ -114,7 +105,6 @@ TEST_F(ProfileFiles, SavedProfilesOpenInOtherReaders) {
   EXPECT_NE(cmsReadTag(lcms, cmsSigRedColorantTag), nullptr);
   EXPECT_NE(cmsReadTag(lcms, cmsSigBlueTRCTag), nullptr);
   cmsCloseProfile(lcms);
-
   if (system("command -v iccdump >/dev/null 2>&1") != 0) GTEST_SKIP() << "iccdump is not installed";
   const std::string command = "iccdump -v 3 '" + Posix("a98.icc") + "' >/dev/null 2>&1";
   EXPECT_EQ(system(command.c_str()), 0);
@@ -150,9 +140,7 @@ TEST(MalformedProfiles, AreRefusedWithInvalidProfile) {
   };
   for (const Case& c : cases) {
     SCOPED_TRACE(c.what);
-    SetLastError(kSentinel);
-    EXPECT_EQ(OpenMemory(c.bytes), nullptr);
-    EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_INVALID_PROFILE));
+    EXPECT_WIN32(OpenMemory(c.bytes), nullptr, ERROR_INVALID_PROFILE);
   }
   // The same limits accept a profile that just fits.
   for (const Bytes& fits : {MakeProfile({{Sig("wtpt"), 144, 20}}, 20), MakeProfile({{Sig("wtpt"), 164, 0}}, 20),
@@ -169,13 +157,9 @@ TEST(MalformedProfiles, AreRefusedWithInvalidProfile) {
 TEST_F(ProfileFiles, TruncatedFiles) {
   const Bytes srgb = ReadBytes(IccPath("sRGB.icc"));
   WriteBytes(Posix("cut.icc"), Bytes(srgb.begin(), srgb.end() - 8));
-  SetLastError(kSentinel);
-  EXPECT_EQ(OpenPath(Win("cut.icc"), PROFILE_READ, OPEN_EXISTING), nullptr);
-  EXPECT_EQ(GetLastError(), static_cast<DWORD>(ERROR_INVALID_PROFILE));
-
+  EXPECT_WIN32(OpenPath(Win("cut.icc"), PROFILE_READ, OPEN_EXISTING), nullptr, ERROR_INVALID_PROFILE);
   WriteBytes(Posix("pad.icc"), Bytes(srgb.begin(), srgb.end() - 1));
   HPROFILE h = OpenPath(Win("pad.icc"), PROFILE_READ, OPEN_EXISTING);
-  ASSERT_NE(h, nullptr);
   BOOL valid = TRUE;
   SetLastError(kSentinel);
   EXPECT_FALSE(IsColorProfileValid(h, &valid));
@@ -254,10 +238,7 @@ TEST(IsColorProfileValid, NeedsTheTagsOfItsClass) {
 
 TEST(IsColorProfileValid, FollowsEditsAndChecksItsArgument) {
   HPROFILE h = OpenMemory(ReadBytes(IccPath("sRGB.icc")));
-  ASSERT_NE(h, nullptr);
-  SetLastError(kSentinel);
-  EXPECT_FALSE(IsColorProfileValid(h, nullptr));
-  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
+  EXPECT_WIN32(IsColorProfileValid(h, nullptr), FALSE, ERROR_INVALID_PARAMETER);
   BOOL valid = FALSE;
   // A size change re-lays the profile out and keeps the size field right.
   ASSERT_TRUE(SetColorProfileElementSize(h, Sig("desc"), 3));
@@ -287,36 +268,23 @@ TEST_F(ColorDirectory, ReportsBytesIncludingTheTerminator) {
   const std::string expected = win32::WindowsPathFromPosix(colorDir_);
   const DWORD needed = static_cast<DWORD>(expected.size() + 1);
   DWORD size = 0;
-  SetLastError(kSentinel);
-  EXPECT_FALSE(GetColorDirectoryA(nullptr, nullptr, &size));
-  EXPECT_EQ(GetLastError(), ERROR_INSUFFICIENT_BUFFER);
+  EXPECT_WIN32(GetColorDirectoryA(nullptr, nullptr, &size), FALSE, ERROR_INSUFFICIENT_BUFFER);
   EXPECT_EQ(size, needed);
-
   std::string buffer(needed + 8, '#');
   size = needed - 1;
-  SetLastError(kSentinel);
-  EXPECT_FALSE(GetColorDirectoryA(nullptr, buffer.data(), &size));
-  EXPECT_EQ(GetLastError(), ERROR_INSUFFICIENT_BUFFER);
+  EXPECT_WIN32(GetColorDirectoryA(nullptr, buffer.data(), &size), FALSE, ERROR_INSUFFICIENT_BUFFER);
   EXPECT_EQ(size, needed);
   EXPECT_EQ(buffer, std::string(needed + 8, '#'));
-
   size = needed;
-  SetLastError(kSentinel);
-  ASSERT_TRUE(GetColorDirectoryA(nullptr, buffer.data(), &size));
-  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+  EXPECT_WIN32(GetColorDirectoryA(nullptr, buffer.data(), &size), TRUE, ERROR_SUCCESS);
   EXPECT_EQ(size, needed);
   EXPECT_EQ(std::string(buffer.c_str()), expected);
   EXPECT_NE(expected.back(), '\\');
   EXPECT_EQ(buffer[needed], '#');
   struct stat st;
   EXPECT_EQ(stat(colorDir_.c_str(), &st), 0) << "created when first needed";
-
-  SetLastError(kSentinel);
-  EXPECT_FALSE(GetColorDirectoryA("machine", buffer.data(), &size));
-  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
-  SetLastError(kSentinel);
-  EXPECT_FALSE(GetColorDirectoryA(nullptr, buffer.data(), nullptr));
-  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
+  EXPECT_WIN32(GetColorDirectoryA("machine", buffer.data(), &size), FALSE, ERROR_INVALID_PARAMETER);
+  EXPECT_WIN32(GetColorDirectoryA(nullptr, buffer.data(), nullptr), FALSE, ERROR_INVALID_PARAMETER);
 }
 
 TEST_F(ColorDirectory, FallsBackToTheFreedesktopLocation) {
@@ -340,36 +308,19 @@ TEST_F(ColorDirectory, FallsBackToTheFreedesktopLocation) {
 }
 
 TEST_F(ColorDirectory, InstallCopiesAndReplaces) {
-  SetLastError(kSentinel);
-  EXPECT_FALSE(InstallColorProfileA("machine", Win("x.icc").c_str()));
-  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
-  SetLastError(kSentinel);
-  EXPECT_FALSE(InstallColorProfileA(nullptr, nullptr));
-  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
-  SetLastError(kSentinel);
-  EXPECT_FALSE(InstallColorProfileA(nullptr, Win("missing.icc").c_str()));
-  EXPECT_EQ(GetLastError(), ERROR_FILE_NOT_FOUND);
-  SetLastError(kSentinel);
-  EXPECT_FALSE(InstallColorProfileA(nullptr, "D:\\x.icc"));
-  EXPECT_EQ(GetLastError(), ERROR_PATH_NOT_FOUND);
-
+  EXPECT_WIN32(InstallColorProfileA("machine", Win("x.icc").c_str()), FALSE, ERROR_INVALID_PARAMETER);
+  EXPECT_WIN32(InstallColorProfileA(nullptr, nullptr), FALSE, ERROR_INVALID_PARAMETER);
+  EXPECT_WIN32(InstallColorProfileA(nullptr, Win("missing.icc").c_str()), FALSE, ERROR_FILE_NOT_FOUND);
+  EXPECT_WIN32(InstallColorProfileA(nullptr, "D:\\x.icc"), FALSE, ERROR_PATH_NOT_FOUND);
   const std::string path = CopyOf("sRGB.icc", "Work 1.icc");
-  SetLastError(kSentinel);
-  ASSERT_TRUE(InstallColorProfileA(nullptr, path.c_str()));
-  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+  EXPECT_WIN32(InstallColorProfileA(nullptr, path.c_str()), TRUE, ERROR_SUCCESS);
   EXPECT_EQ(ReadBytes(colorDir_ + "/Work 1.icc"), ReadBytes(IccPath("sRGB.icc")));
-
   // A file of the same name from an earlier run is replaced.
   CopyOf("Gray.icc", "Work 1.icc");
-  SetLastError(kSentinel);
-  ASSERT_TRUE(InstallColorProfileA(nullptr, path.c_str()));
-  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+  EXPECT_WIN32(InstallColorProfileA(nullptr, path.c_str()), TRUE, ERROR_SUCCESS);
   EXPECT_EQ(ReadBytes(colorDir_ + "/Work 1.icc"), ReadBytes(IccPath("Gray.icc")));
-
   // Installing the installed copy itself leaves it as it is.
-  SetLastError(kSentinel);
-  ASSERT_TRUE(InstallColorProfileA(nullptr, win32::WindowsPathFromPosix(colorDir_ + "/Work 1.icc").c_str()));
-  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+  EXPECT_WIN32(InstallColorProfileA(nullptr, win32::WindowsPathFromPosix(colorDir_ + "/Work 1.icc").c_str()), TRUE, ERROR_SUCCESS);
   EXPECT_EQ(ReadBytes(colorDir_ + "/Work 1.icc"), ReadBytes(IccPath("Gray.icc")));
 }
 

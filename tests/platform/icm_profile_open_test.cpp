@@ -4,7 +4,6 @@
 
 #include <cstring>
 #include <functional>
-#include <memory>
 
 #include "handle_table.h"
 #include "icc_test_support.h"
@@ -20,7 +19,7 @@ TEST(OpenColorProfileA, RefusesBadArguments) {
   char* name = const_cast<char*>(path.c_str());
   void* mem = const_cast<std::uint8_t*>(srgb.data());
   const DWORD size = static_cast<DWORD>(srgb.size());
-  struct Case {
+  struct {
     const char* what;
     bool nullProfile;
     PROFILE profile;
@@ -39,11 +38,9 @@ TEST(OpenColorProfileA, RefusesBadArguments) {
       {"memory too short", false, {PROFILE_MEMBUFFER, mem, 131}, PROFILE_READ, OPEN_EXISTING,
        ERROR_INVALID_PROFILE},
   };
-  for (Case& c : cases) {
+  for (auto& c : cases) {
     SCOPED_TRACE(c.what);
-    SetLastError(kSentinel);
-    EXPECT_EQ(OpenColorProfileA(c.nullProfile ? nullptr : &c.profile, c.access, 0, c.creation), nullptr);
-    EXPECT_EQ(GetLastError(), c.error);
+    EXPECT_WIN32(OpenColorProfileA(c.nullProfile ? nullptr : &c.profile, c.access, 0, c.creation), nullptr, c.error);
   }
 }
 
@@ -52,22 +49,13 @@ TEST(OpenColorProfileA, ReadsARealProfileInFileOrder) {
   const std::vector<TagEntry> table = TagTable(raw);
   SetLastError(kSentinel);
   HPROFILE h = OpenPath(win32::WindowsPathFromPosix(IccPath("sRGB.icc")), PROFILE_READ, OPEN_EXISTING);
-  ASSERT_NE(h, nullptr);
   EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
-
   DWORD count = 0;
-  SetLastError(kSentinel);
-  ASSERT_TRUE(GetCountColorProfileElements(h, &count));
-  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
-  ASSERT_EQ(count, table.size());
-  for (DWORD i = 0; i < count; ++i) {
-    TAGTYPE tag = 0;
-    ASSERT_TRUE(GetColorProfileElementTag(h, i + 1, &tag));
-    EXPECT_EQ(tag, table[i].signature) << i;
-  }
-  SetLastError(kSentinel);
-  EXPECT_TRUE(CloseColorProfile(h));
-  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+  EXPECT_WIN32(GetCountColorProfileElements(h, &count), TRUE, ERROR_SUCCESS);
+  std::vector<TAGTYPE> expected;
+  for (const TagEntry& e : table) expected.push_back(e.signature);
+  EXPECT_EQ(TagList(h), expected);
+  EXPECT_WIN32(CloseColorProfile(h), TRUE, ERROR_SUCCESS);
 }
 
 // Every call taking a profile refuses a handle that is not an open profile.
@@ -98,113 +86,92 @@ TEST(ProfileCalls, RefuseHandlesThatAreNotOpenProfiles) {
     };
     for (const auto& call : calls) {
       SCOPED_TRACE(call.first);
-      SetLastError(kSentinel);
-      EXPECT_FALSE(call.second());
-      EXPECT_EQ(GetLastError(), ERROR_INVALID_HANDLE);
+      EXPECT_WIN32(call.second(), FALSE, ERROR_INVALID_HANDLE);
     }
   }
   // The transform handle survived the attempts.
   EXPECT_NE(win32::Handles().Remove<int>(transform, win32::HandleKind::Transform), nullptr);
 }
 
-class OpenModes : public TempFolderTest {};
+using OpenModes = TempFolderTest;
 
 TEST_F(OpenModes, CreationModesOnExistingAndMissingFiles) {
   const Bytes srgb = ReadBytes(IccPath("sRGB.icc"));
-  struct Case {
+  const struct {
     DWORD creation;
     bool exists;
-    DWORD error;        // 0: opens
-    bool blank;         // opens as a blank profile
+    DWORD error;  // 0: opens
+    bool blank;   // opens as a blank profile
   } cases[] = {
-      {OPEN_EXISTING, true, 0, false},   {OPEN_EXISTING, false, ERROR_FILE_NOT_FOUND, false},
-      {OPEN_ALWAYS, true, 0, false},     {OPEN_ALWAYS, false, 0, true},
+      {OPEN_EXISTING, true, 0, false},    {OPEN_EXISTING, false, ERROR_FILE_NOT_FOUND, false},
+      {OPEN_ALWAYS, true, 0, false},      {OPEN_ALWAYS, false, 0, true},
       {CREATE_NEW, true, ERROR_FILE_EXISTS, false}, {CREATE_NEW, false, 0, true},
-      {CREATE_ALWAYS, true, 0, true},    {CREATE_ALWAYS, false, 0, true},
+      {CREATE_ALWAYS, true, 0, true},     {CREATE_ALWAYS, false, 0, true},
       {TRUNCATE_EXISTING, true, 0, true}, {TRUNCATE_EXISTING, false, ERROR_FILE_NOT_FOUND, false},
   };
   int n = 0;
-  for (const Case& c : cases) {
+  for (const auto& c : cases) {
     SCOPED_TRACE(testing::Message() << "creation " << c.creation << (c.exists ? " existing" : " missing"));
     const std::string name = "p" + std::to_string(n++) + ".icc";
     if (c.exists) WriteBytes(Posix(name), srgb);
     SetLastError(kSentinel);
     HPROFILE h = OpenPath(Win(name), PROFILE_READWRITE, c.creation);
+    EXPECT_EQ(GetLastError(), c.error);
     if (c.error != 0) {
       EXPECT_EQ(h, nullptr);
-      EXPECT_EQ(GetLastError(), c.error);
       continue;
     }
-    ASSERT_NE(h, nullptr);
-    EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
     DWORD count = 99;
     ASSERT_TRUE(GetCountColorProfileElements(h, &count));
     EXPECT_EQ(count, c.blank ? 0u : TagTable(srgb).size());
     ASSERT_TRUE(CloseColorProfile(h));
     const Bytes after = ReadBytes(Posix(name));
-    if (c.blank) {
-      // Written at close: header with 'acsp', no tags, the size field matching.
+    if (c.blank) {  // written at close: header with 'acsp', no tags, the size field matching
       ASSERT_EQ(after.size(), 132u);
       EXPECT_EQ(BE32(after, 0), 132u);
       EXPECT_EQ(BE32(after, 36), Sig("acsp"));
       EXPECT_EQ(BE32(after, 128), 0u);
     } else {
-      EXPECT_EQ(after, srgb);  // opened, untouched, not rewritten
+      EXPECT_EQ(after, srgb);
     }
   }
-}
-
-TEST_F(OpenModes, ReadOnlyBlankProfileIsNeverWritten) {
+  // A read-only blank profile is never written.
   HPROFILE h = OpenPath(Win("ro.icc"), PROFILE_READ, CREATE_ALWAYS);
-  ASSERT_NE(h, nullptr);
   ASSERT_TRUE(CloseColorProfile(h));
   struct stat st;
   EXPECT_NE(stat(Posix("ro.icc").c_str(), &st), 0);
 }
 
-TEST_F(OpenModes, PathErrors) {
-  SetLastError(kSentinel);
-  EXPECT_EQ(OpenPath(Win("no/such/folder.icc"), PROFILE_READ, OPEN_EXISTING), nullptr);
-  EXPECT_EQ(GetLastError(), ERROR_PATH_NOT_FOUND);
-  SetLastError(kSentinel);
-  EXPECT_EQ(OpenPath(Win("no/such/folder.icc"), PROFILE_READWRITE, CREATE_ALWAYS), nullptr);
-  EXPECT_EQ(GetLastError(), ERROR_PATH_NOT_FOUND);
-  SetLastError(kSentinel);
-  EXPECT_EQ(OpenPath(Win(""), PROFILE_READ, OPEN_EXISTING), nullptr);  // a folder
-  EXPECT_EQ(GetLastError(), ERROR_ACCESS_DENIED);
-  SetLastError(kSentinel);
-  EXPECT_EQ(OpenPath(Win(std::string(MAX_PATH, 'n')), PROFILE_READ, OPEN_EXISTING), nullptr);
-  EXPECT_EQ(GetLastError(), ERROR_FILENAME_EXCED_RANGE);
-}
-
-TEST_F(OpenModes, BareNamesAreFoundInTheColorDirectory) {
+TEST_F(OpenModes, PathErrorsAndBareNames) {
   ASSERT_EQ(mkdir(colorDir_.c_str(), 0777), 0);
+  const struct {
+    std::string path;
+    DWORD access, creation, error;
+  } cases[] = {
+      {Win("no/such/folder.icc"), PROFILE_READ, OPEN_EXISTING, ERROR_PATH_NOT_FOUND},
+      {Win("no/such/folder.icc"), PROFILE_READWRITE, CREATE_ALWAYS, ERROR_PATH_NOT_FOUND},
+      {Win(""), PROFILE_READ, OPEN_EXISTING, ERROR_ACCESS_DENIED},  // a folder
+      {Win(std::string(MAX_PATH, 'n')), PROFILE_READ, OPEN_EXISTING, ERROR_FILENAME_EXCED_RANGE},
+      {"missing.icm", PROFILE_READ, OPEN_EXISTING, ERROR_FILE_NOT_FOUND},
+  };
+  for (const auto& c : cases) EXPECT_WIN32(OpenPath(c.path, c.access, c.creation), nullptr, c.error);
+  // A bare name is looked up in the colour directory.
   WriteBytes(colorDir_ + "/Bare Name.icm", ReadBytes(IccPath("Gray.icc")));
   SetLastError(kSentinel);
   HPROFILE h = OpenPath("Bare Name.icm", PROFILE_READ, OPEN_EXISTING);
-  ASSERT_NE(h, nullptr);
   EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
   PROFILEHEADER header;
   ASSERT_TRUE(GetColorProfileHeader(h, &header));
   EXPECT_EQ(header.phDataColorSpace, static_cast<DWORD>(SPACE_GRAY));
   EXPECT_TRUE(CloseColorProfile(h));
-  SetLastError(kSentinel);
-  EXPECT_EQ(OpenPath("missing.icm", PROFILE_READ, OPEN_EXISTING), nullptr);
-  EXPECT_EQ(GetLastError(), ERROR_FILE_NOT_FOUND);
 }
 
 TEST(ColorProfileHeader, ComesOutInHostOrder) {
   const Bytes raw = ReadBytes(IccPath("sRGB.icc"));
   HPROFILE h = OpenMemory(raw, PROFILE_READ);
-  ASSERT_NE(h, nullptr);
-  SetLastError(kSentinel);
-  EXPECT_FALSE(GetColorProfileHeader(h, nullptr));
-  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
-
+  EXPECT_WIN32(GetColorProfileHeader(h, nullptr), FALSE, ERROR_INVALID_PARAMETER);
   PROFILEHEADER header;
-  SetLastError(kSentinel);
-  ASSERT_TRUE(GetColorProfileHeader(h, &header));
-  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+  EXPECT_WIN32(GetColorProfileHeader(h, &header), TRUE, ERROR_SUCCESS);
   EXPECT_EQ(header.phSize, raw.size());
   EXPECT_EQ(header.phClass, static_cast<DWORD>(CLASS_MONITOR));
   EXPECT_EQ(header.phDataColorSpace, static_cast<DWORD>(SPACE_RGB));
@@ -217,20 +184,13 @@ TEST(ColorProfileHeader, ComesOutInHostOrder) {
   EXPECT_EQ(header.phDateTime[0], (2004u << 16) | 8u);
   EXPECT_EQ(header.phDateTime[1], (13u << 16) | 12u);
   EXPECT_EQ(header.phDateTime[2], (18u << 16) | 6u);
-
-  SetLastError(kSentinel);
-  EXPECT_FALSE(SetColorProfileHeader(h, &header));
-  EXPECT_EQ(GetLastError(), ERROR_ACCESS_DENIED);
+  EXPECT_WIN32(SetColorProfileHeader(h, &header), FALSE, ERROR_ACCESS_DENIED);
   EXPECT_TRUE(CloseColorProfile(h));
 }
 
 TEST(ColorProfileHeader, SetStoresTheBytesAsGiven) {
   HPROFILE h = OpenMemory(ReadBytes(IccPath("sRGB.icc")));
-  ASSERT_NE(h, nullptr);
-  SetLastError(kSentinel);
-  EXPECT_FALSE(SetColorProfileHeader(h, nullptr));
-  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
-
+  EXPECT_WIN32(SetColorProfileHeader(h, nullptr), FALSE, ERROR_INVALID_PARAMETER);
   PROFILEHEADER in;
   ASSERT_TRUE(GetColorProfileHeader(h, &in));
   in.phSize = 12345;
@@ -238,18 +198,13 @@ TEST(ColorProfileHeader, SetStoresTheBytesAsGiven) {
   in.phDateTime[0] = (2026u << 16) | 12;
   in.phRenderingIntent = INTENT_SATURATION;
   for (int i = 0; i < 44; ++i) in.phReserved[i] = static_cast<BYTE>(i + 1);
-  SetLastError(kSentinel);
-  ASSERT_TRUE(SetColorProfileHeader(h, &in));
-  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+  EXPECT_WIN32(SetColorProfileHeader(h, &in), TRUE, ERROR_SUCCESS);
   PROFILEHEADER out;
   ASSERT_TRUE(GetColorProfileHeader(h, &out));
   EXPECT_EQ(std::memcmp(&in, &out, sizeof in), 0);
-
   // On disk every word is big-endian again; the size field is the real size.
   std::vector<std::uint8_t> bytes;
-  SetLastError(kSentinel);
-  ASSERT_TRUE(win32::icm::SerializeProfile(h, bytes));
-  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+  EXPECT_WIN32(win32::icm::SerializeProfile(h, bytes), TRUE, ERROR_SUCCESS);
   EXPECT_EQ(BE32(bytes, 0), bytes.size());
   EXPECT_EQ(BE32(bytes, 12), Sig("prtr"));
   EXPECT_EQ(BE32(bytes, 24), (2026u << 16) | 12);

@@ -1,60 +1,62 @@
-// Conformance of the kernel file calls (CopyFileA, DeleteFileA, the FindFile family,
-// CreateFileA/WriteFile/CloseHandle), each test in a fresh temporary folder.
+// The kernel file calls: the FindFirstFileA name matcher, CopyFileA, DeleteFileA, the
+// FindFile family and CreateFileA/WriteFile/CloseHandle, each in a fresh folder.
 #include <dirent.h>
 #include <fcntl.h>
-#include <gtest/gtest.h>
 #include <signal.h>
 #include <sys/resource.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <cstdlib>
 #include <cstring>
-#include <fstream>
 #include <map>
 #include <set>
-#include <sstream>
-#include <string>
 
-#include "win32_paths.h"
-#include "windows.h"
+#include "icc_test_support.h"
+#include "kernel/wildcard.h"
 
 namespace {
 
-constexpr DWORD kSentinel = 0xDEADBEEF;
+using icctest::kSentinel;
 constexpr time_t kY2k = 946684800;  // 2000-01-01 00:00 UTC, FILETIME 0x01BF53EB256D4000
 
-// Sets the sentinel, makes the call, checks its result and the last error it left.
-#define EXPECT_CALL(call, result, code)                                  \
-  do {                                                                   \
-    SetLastError(kSentinel);                                             \
-    EXPECT_EQ((call), (result)) << #call;                                \
-    EXPECT_EQ(GetLastError(), static_cast<DWORD>(code)) << #call;        \
-  } while (0)
+const char* const kNames[] = {"a.icc", "B.ICM", "h.iCc", "e.icx", "c.ic",  ".icc",
+                              "x.y.icm", "d.ic.bak", "icc", "f.txt", "g",  "x.pf"};
+const std::set<std::string> kIcc = {"a.icc", "B.ICM", "h.iCc", "e.icx", "c.ic", ".icc", "x.y.icm"};
 
-class FileTest : public ::testing::Test {
+TEST(FileWildcard, MatchesExactlyTheExpectedNames) {
+  const std::set<std::string> all(std::begin(kNames), std::end(kNames));
+  const struct {
+    const char* pattern;
+    std::set<std::string> matches;
+  } cases[] = {
+      {"*.ic*", kIcc}, {"*.IC*", kIcc}, {"*.*", all}, {"*", all},
+      // "?" may match nothing at a dot or at the end.
+      {"?.ic?", {"a.icc", "B.ICM", "h.iCc", "e.icx", "c.ic", ".icc"}},
+      {"??", {"g"}},
+      {"*.", {"icc", "g"}},  // names without a dot
+      {"a*.*", {"a.icc"}}, {"A*.*", {"a.icc"}},
+      // The "*" before a dot stops at the last dot only; a plain "*" runs over dots.
+      {"*.ic", {"c.ic"}}, {"*.bak", {"d.ic.bak"}}, {"*.icm", {"B.ICM", "x.y.icm"}},
+      {"*.icc", {"a.icc", "h.iCc", ".icc"}}, {"*c", {"a.icc", "h.iCc", "c.ic", ".icc", "icc"}},
+      // ".*" also matches the end of a name without a dot.
+      {"g.*", {"g"}}, {"x.*", {"x.y.icm", "x.pf"}}, {"g.", {"g"}},
+      {"D.IC.BAK", {"d.ic.bak"}}, {"", {}},
+  };
+  for (const auto& c : cases) {
+    for (const std::string name : kNames) {
+      EXPECT_EQ(win32::MatchesFileWildcard(c.pattern, name), c.matches.count(name) == 1)
+          << "pattern \"" << c.pattern << "\", name \"" << name << "\"";
+    }
+  }
+}
+
+class FileTest : public icctest::TempFolderTest {
  protected:
   void SetUp() override {
-    char pattern[] = "/tmp/tw-files-XXXXXX";
-    ASSERT_NE(mkdtemp(pattern), nullptr);
-    root_ = pattern;
+    TempFolderTest::SetUp();
     Put("ro", "read-only");
     chmod(Posix("ro").c_str(), 0444);
     mkdir(Posix("dir").c_str(), 0777);
-  }
-  void TearDown() override { std::system(("rm -rf '" + root_ + "'").c_str()); }
-
-  std::string Posix(const std::string& name) const { return root_ + "/" + name; }
-  std::string Win(const std::string& name) const {
-    return win32::WindowsPathFromPosix(Posix(name));
-  }
-  void Put(const std::string& name, const std::string& bytes) const {
-    std::ofstream(Posix(name), std::ios::binary) << bytes;
-  }
-  std::string Get(const std::string& name) const {
-    std::ostringstream bytes;
-    bytes << std::ifstream(Posix(name), std::ios::binary).rdbuf();
-    return bytes.str();
   }
   void SetTimes(const std::string& name) const {
     const struct timespec times[2] = {{kY2k, 0}, {kY2k, 0}};
@@ -64,15 +66,12 @@ class FileTest : public ::testing::Test {
     std::set<std::string> names;
     DIR* dir = opendir(root_.c_str());
     while (const dirent* e = readdir(dir))
-      if (std::strcmp(e->d_name, ".") != 0 && std::strcmp(e->d_name, "..") != 0)
-        names.insert(e->d_name);
+      if (std::strcmp(e->d_name, ".") != 0 && std::strcmp(e->d_name, "..") != 0) names.insert(e->d_name);
     closedir(dir);
     return names;
   }
   // A Windows path of more than MAX_PATH characters inside the folder.
   std::string TooLong() const { return Win(std::string(120, 'x') + "/" + std::string(200, 'y')); }
-
-  std::string root_;
 };
 
 using CopyFileATest = FileTest;
@@ -100,24 +99,23 @@ TEST_F(CopyFileATest, RefusesEachFailureWithItsCode) {
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.from + " -> " + c.to);
-    EXPECT_CALL(CopyFileA(c.from.c_str(), c.to.c_str(), c.failIfExists), FALSE, c.code);
+    EXPECT_WIN32(CopyFileA(c.from.c_str(), c.to.c_str(), c.failIfExists), FALSE, c.code);
   }
-  EXPECT_CALL(CopyFileA(nullptr, Win("new").c_str(), FALSE), FALSE, ERROR_PATH_NOT_FOUND);
+  EXPECT_WIN32(CopyFileA(nullptr, Win("new").c_str(), FALSE), FALSE, ERROR_PATH_NOT_FOUND);
   EXPECT_EQ(Get("dst"), "old");
   EXPECT_EQ(Get("ro"), "read-only");
   EXPECT_EQ(Listing(), (std::set<std::string>{"src", "dst", "ro", "dir"}));
 }
 
 TEST_F(CopyFileATest, CopiesContentTimeAndReadOnlyBitAndReplacesWhole) {
-  // Several reads long, and a multiple of no buffer size.
   std::string big(3 * 65536 + 17, '\0');
   for (std::size_t i = 0; i < big.size(); ++i) big[i] = static_cast<char>(i * 7 + i / 251);
   Put("big", big);
   SetTimes("big");
   chmod(Posix("big").c_str(), 0444);
   Put("dst", "an older and longer content");
-  EXPECT_CALL(CopyFileA(Win("big").c_str(), Win("copy").c_str(), TRUE), TRUE, ERROR_SUCCESS);
-  EXPECT_CALL(CopyFileA(Win("big").c_str(), Win("dst").c_str(), FALSE), TRUE, ERROR_SUCCESS);
+  EXPECT_WIN32(CopyFileA(Win("big").c_str(), Win("copy").c_str(), TRUE), TRUE, ERROR_SUCCESS);
+  EXPECT_WIN32(CopyFileA(Win("big").c_str(), Win("dst").c_str(), FALSE), TRUE, ERROR_SUCCESS);
   for (const char* name : {"copy", "dst"}) {
     EXPECT_EQ(Get(name), big) << name;
     struct stat st;
@@ -125,12 +123,10 @@ TEST_F(CopyFileATest, CopiesContentTimeAndReadOnlyBitAndReplacesWhole) {
     EXPECT_EQ(st.st_mtime, kY2k);
     EXPECT_EQ(st.st_mode & S_IWUSR, 0u);
   }
-  // No temporary file is left behind.
   EXPECT_EQ(Listing(), (std::set<std::string>{"big", "copy", "dst", "ro", "dir"}));
 }
 
-// Copies with writes beyond 64 KiB failing, as on a full disk; exits 0 when the copy
-// fails with a code. Meant for a child process, where the limit stays.
+// In a child process: copies with writes beyond 64 KiB failing, as on a full disk.
 [[noreturn]] void CopyUnderFileSizeLimit(const std::string& from, const std::string& to) {
   signal(SIGXFSZ, SIG_IGN);
   struct rlimit limit;
@@ -159,10 +155,10 @@ TEST_F(DeleteFileATest, DeletesFilesOnly) {
       {"C:\\a.icc", ERROR_PATH_NOT_FOUND},     {"", ERROR_PATH_NOT_FOUND},
       {TooLong(), ERROR_FILENAME_EXCED_RANGE},
   };
-  for (const auto& c : cases) EXPECT_CALL(DeleteFileA(c.path.c_str()), FALSE, c.code);
+  for (const auto& c : cases) EXPECT_WIN32(DeleteFileA(c.path.c_str()), FALSE, c.code);
   EXPECT_EQ(Listing(), (std::set<std::string>{"ro", "dir"}));
   Put("a.icc", "x");
-  EXPECT_CALL(DeleteFileA(Win("a.icc").c_str()), TRUE, ERROR_SUCCESS);
+  EXPECT_WIN32(DeleteFileA(Win("a.icc").c_str()), TRUE, ERROR_SUCCESS);
   EXPECT_EQ(Listing(), (std::set<std::string>{"ro", "dir"}));
 }
 
@@ -170,12 +166,9 @@ class FindFileTest : public FileTest {
  protected:
   void SetUp() override {
     FileTest::SetUp();
-    const char* names[] = {"a.icc", "B.ICM", "h.iCc", "e.icx", "c.ic", ".icc",
-                           "x.y.icm", "d.ic.bak", "icc", "f.txt", "g", "x.pf"};
-    for (const char* name : names) Put(name, name);  // each file's size is its name's length
+    for (const char* name : kNames) Put(name, name);  // each file's size is its name's length
   }
-  // Every entry a search returns, by name; checks that each comes once and that the
-  // search ends with ERROR_NO_MORE_FILES.
+  // Every entry a search returns, by name; each must come once, then ERROR_NO_MORE_FILES.
   std::map<std::string, WIN32_FIND_DATAA> Search(const std::string& pattern) {
     std::map<std::string, WIN32_FIND_DATAA> found;
     WIN32_FIND_DATAA data;
@@ -191,24 +184,19 @@ class FindFileTest : public FileTest {
     EXPECT_TRUE(FindClose(find));
     return found;
   }
-  std::set<std::string> Names(const std::string& pattern) {
-    std::set<std::string> names;
-    for (const auto& entry : Search(pattern)) names.insert(entry.first);
-    return names;
-  }
 };
 
-TEST_F(FindFileTest, ReturnsEachMatchingNameOnce) {
-  EXPECT_EQ(Names("*.ic*"),
-            (std::set<std::string>{"a.icc", "B.ICM", "h.iCc", "e.icx", "c.ic", ".icc", "x.y.icm"}));
-  EXPECT_EQ(Names("*.*"), Listing());  // never "." or ".."
-}
-
-TEST_F(FindFileTest, FillsAttributesSizesAndTimes) {
+TEST_F(FindFileTest, ReturnsEachMatchWithItsAttributesSizesAndTimes) {
   SetTimes("B.ICM");
   // A sparse file of 5 GiB + 3 bytes needs both size words.
   ASSERT_EQ(truncate((Put("huge", ""), Posix("huge")).c_str(), (5ll << 30) + 3), 0);
+  std::set<std::string> names;
+  for (const auto& entry : Search("*.ic*")) names.insert(entry.first);
+  EXPECT_EQ(names, kIcc);
   auto found = Search("*");
+  names.clear();
+  for (const auto& entry : found) names.insert(entry.first);
+  EXPECT_EQ(names, Listing());  // never "." or ".."
   EXPECT_EQ(found["ro"].dwFileAttributes, DWORD{FILE_ATTRIBUTE_READONLY});
   EXPECT_EQ(found["dir"].dwFileAttributes, DWORD{FILE_ATTRIBUTE_DIRECTORY});
   EXPECT_EQ(found["B.ICM"].dwFileAttributes, DWORD{FILE_ATTRIBUTE_NORMAL});
@@ -244,7 +232,7 @@ TEST_F(FindFileTest, RefusesBadPatternsWithoutTouchingTheData) {
   for (const auto& c : cases) {
     WIN32_FIND_DATAA data;
     std::memset(&data, 0xCC, sizeof data);
-    EXPECT_CALL(FindFirstFileA(c.pattern.c_str(), &data), INVALID_HANDLE_VALUE, c.code);
+    EXPECT_WIN32(FindFirstFileA(c.pattern.c_str(), &data), INVALID_HANDLE_VALUE, c.code);
     EXPECT_EQ(static_cast<unsigned char>(data.cFileName[0]), 0xCCu) << c.pattern;
   }
 }
@@ -253,13 +241,13 @@ TEST_F(FindFileTest, HandlesCloseOnceAndOnlyByFindClose) {
   WIN32_FIND_DATAA data;
   HANDLE find = FindFirstFileA(Win("*").c_str(), &data);
   ASSERT_NE(find, INVALID_HANDLE_VALUE);
-  EXPECT_CALL(CloseHandle(find), FALSE, ERROR_INVALID_HANDLE);
-  EXPECT_CALL(FindNextFileA(find, nullptr), FALSE, ERROR_INVALID_PARAMETER);
-  EXPECT_CALL(FindNextFileA(find, &data), TRUE, ERROR_SUCCESS);  // still open
-  EXPECT_CALL(FindClose(find), TRUE, ERROR_SUCCESS);
+  EXPECT_WIN32(CloseHandle(find), FALSE, ERROR_INVALID_HANDLE);
+  EXPECT_WIN32(FindNextFileA(find, nullptr), FALSE, ERROR_INVALID_PARAMETER);
+  EXPECT_WIN32(FindNextFileA(find, &data), TRUE, ERROR_SUCCESS);  // still open
+  EXPECT_WIN32(FindClose(find), TRUE, ERROR_SUCCESS);
   for (HANDLE bad : {find, INVALID_HANDLE_VALUE}) {
-    EXPECT_CALL(FindClose(bad), FALSE, ERROR_INVALID_HANDLE);
-    EXPECT_CALL(FindNextFileA(bad, &data), FALSE, ERROR_INVALID_HANDLE);
+    EXPECT_WIN32(FindClose(bad), FALSE, ERROR_INVALID_HANDLE);
+    EXPECT_WIN32(FindNextFileA(bad, &data), FALSE, ERROR_INVALID_HANDLE);
   }
 }
 
@@ -311,7 +299,7 @@ TEST_F(CreateFileATest, RefusesBadArgumentsFoldersAndReadOnlyFiles) {
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.path + " " + std::to_string(c.disposition));
-    EXPECT_CALL(CreateFileA(c.path.c_str(), c.access, 0, nullptr, c.disposition, 0, nullptr),
+    EXPECT_WIN32(CreateFileA(c.path.c_str(), c.access, 0, nullptr, c.disposition, 0, nullptr),
                 INVALID_HANDLE_VALUE, c.code);
   }
   EXPECT_EQ(Get("ro"), "read-only");
@@ -326,20 +314,20 @@ TEST_F(CreateFileATest, WriteFileWritesFromTheStartAndRefusesBadHandles) {
   ASSERT_NE(readOnly, INVALID_HANDLE_VALUE);
   DWORD n = kSentinel;
   char overlapped[32] = {};
-  EXPECT_CALL(WriteFile(h, "J", 1, &n, nullptr), TRUE, ERROR_SUCCESS);
+  EXPECT_WIN32(WriteFile(h, "J", 1, &n, nullptr), TRUE, ERROR_SUCCESS);
   EXPECT_EQ(n, 1u);
   const std::string big(3 << 20, 'b');
   const DWORD size = static_cast<DWORD>(big.size());
-  EXPECT_CALL(WriteFile(h, big.data(), size, &n, nullptr), TRUE, ERROR_SUCCESS);
+  EXPECT_WIN32(WriteFile(h, big.data(), size, &n, nullptr), TRUE, ERROR_SUCCESS);
   EXPECT_EQ(n, big.size());
-  EXPECT_CALL(WriteFile(h, "abc", 3, nullptr, nullptr), FALSE, ERROR_INVALID_PARAMETER);
-  EXPECT_CALL(WriteFile(h, "abc", 3, &n, overlapped), FALSE, ERROR_INVALID_PARAMETER);
-  EXPECT_CALL(WriteFile(readOnly, "abc", 3, &n, nullptr), FALSE, ERROR_ACCESS_DENIED);
-  EXPECT_CALL(CloseHandle(readOnly), TRUE, ERROR_SUCCESS);
-  EXPECT_CALL(CloseHandle(h), TRUE, ERROR_SUCCESS);
+  EXPECT_WIN32(WriteFile(h, "abc", 3, nullptr, nullptr), FALSE, ERROR_INVALID_PARAMETER);
+  EXPECT_WIN32(WriteFile(h, "abc", 3, &n, overlapped), FALSE, ERROR_INVALID_PARAMETER);
+  EXPECT_WIN32(WriteFile(readOnly, "abc", 3, &n, nullptr), FALSE, ERROR_ACCESS_DENIED);
+  EXPECT_WIN32(CloseHandle(readOnly), TRUE, ERROR_SUCCESS);
+  EXPECT_WIN32(CloseHandle(h), TRUE, ERROR_SUCCESS);
   for (HANDLE bad : {h, INVALID_HANDLE_VALUE, HANDLE{nullptr}}) {
-    EXPECT_CALL(WriteFile(bad, "abc", 3, &n, nullptr), FALSE, ERROR_INVALID_HANDLE);
-    EXPECT_CALL(CloseHandle(bad), FALSE, ERROR_INVALID_HANDLE);
+    EXPECT_WIN32(WriteFile(bad, "abc", 3, &n, nullptr), FALSE, ERROR_INVALID_HANDLE);
+    EXPECT_WIN32(CloseHandle(bad), FALSE, ERROR_INVALID_HANDLE);
   }
   EXPECT_EQ(Get("f"), "J" + big);
 }

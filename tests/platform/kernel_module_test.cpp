@@ -1,122 +1,62 @@
-// Conformance of the kernel calls used at start-up: the Z: mapping, GetModuleFileNameA,
-// CreateDirectoryA and the per-thread last error.
-#include <gtest/gtest.h>
+// The kernel calls used at start-up: the Z: mapping, GetModuleFileNameA,
+// CreateDirectoryA, the per-thread last error, GlobalAlloc and GlobalFree.
 #include <sys/stat.h>
-#include <unistd.h>
 
-#include <cstdlib>
 #include <cstring>
-#include <string>
 #include <thread>
 
-#include "win32_paths.h"
-#include "windows.h"
+#include "icc_test_support.h"
 
 namespace {
 
-constexpr DWORD kSentinel = 0xDEADBEEF;
+using icctest::kSentinel;
 
 TEST(Paths, DriveZIsThePosixRoot) {
   EXPECT_EQ(win32::PosixPathFromWindows("Z:\\tmp\\a.icc"), "/tmp/a.icc");
   EXPECT_EQ(win32::PosixPathFromWindows("z:/tmp/a.icc"), "/tmp/a.icc");
   EXPECT_EQ(win32::PosixPathFromWindows("Z:\\"), "/");
-  EXPECT_FALSE(win32::PosixPathFromWindows("C:\\tmp\\a.icc"));
-  EXPECT_FALSE(win32::PosixPathFromWindows("tmp\\a.icc"));
-  EXPECT_FALSE(win32::PosixPathFromWindows("Z:"));
-  EXPECT_FALSE(win32::PosixPathFromWindows(""));
+  for (const char* bad : {"C:\\tmp\\a.icc", "tmp\\a.icc", "Z:", ""}) EXPECT_FALSE(win32::PosixPathFromWindows(bad));
   EXPECT_EQ(win32::WindowsPathFromPosix("/tmp/a b/c.icc"), "Z:\\tmp\\a b\\c.icc");
+  const std::string relative = win32::WindowsPathFromPosix("x.icc");  // made absolute
+  EXPECT_EQ(relative.rfind("Z:\\", 0), 0u);
+  EXPECT_EQ(relative.substr(relative.size() - 6), "\\x.icc");
 }
 
-TEST(Paths, RelativePosixPathsAreMadeAbsolute) {
-  const std::string windows = win32::WindowsPathFromPosix("x.icc");
-  ASSERT_EQ(windows.rfind("Z:\\", 0), 0u);
-  EXPECT_EQ(windows.substr(windows.size() - 6), "\\x.icc");
-}
-
-TEST(GetModuleFileNameA, NamesTheRunningExecutable) {
-  char buffer[MAX_PATH * 4];
+TEST(GetModuleFileNameA, NamesTheExecutableAndTruncatesToTheBuffer) {
+  char full[MAX_PATH * 4];
   SetLastError(kSentinel);
-  const DWORD n = GetModuleFileNameA(nullptr, buffer, sizeof buffer);
+  const DWORD n = GetModuleFileNameA(nullptr, full, sizeof full);
   ASSERT_GT(n, 3u);
   EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
-  EXPECT_EQ(std::strlen(buffer), n);
-  EXPECT_EQ(std::string(buffer, 3), "Z:\\");
-  const std::string name(buffer);
+  EXPECT_EQ(std::strlen(full), n);
+  const std::string name(full);
+  EXPECT_EQ(name.substr(0, 3), "Z:\\");
   EXPECT_EQ(name.substr(name.rfind('\\') + 1), "platform_tests");
-}
-
-TEST(GetModuleFileNameA, TruncatesToTheBufferAndTerminates) {
-  char full[MAX_PATH * 4];
-  const DWORD n = GetModuleFileNameA(nullptr, full, sizeof full);
   char small[8];
   std::memset(small, 'x', sizeof small);
-  SetLastError(kSentinel);
-  EXPECT_EQ(GetModuleFileNameA(nullptr, small, sizeof small), sizeof small);
-  EXPECT_EQ(GetLastError(), ERROR_INSUFFICIENT_BUFFER);
-  EXPECT_EQ(small[7], '\0');
-  EXPECT_EQ(std::string(small), std::string(full, 7));
-  // Exactly the length: no room for the terminator, so it is truncated too.
-  std::string exact(n, 'x');
-  SetLastError(kSentinel);
-  EXPECT_EQ(GetModuleFileNameA(nullptr, exact.data(), n), n);
-  EXPECT_EQ(GetLastError(), ERROR_INSUFFICIENT_BUFFER);
+  EXPECT_WIN32(GetModuleFileNameA(nullptr, small, sizeof small), sizeof small, ERROR_INSUFFICIENT_BUFFER);
+  EXPECT_EQ(std::string(small), name.substr(0, 7));  // terminated within the buffer
+  std::string exact(n, 'x');  // no room for the terminator
+  EXPECT_WIN32(GetModuleFileNameA(nullptr, exact.data(), n), n, ERROR_INSUFFICIENT_BUFFER);
+  char untouched[16] = "untouched";
+  EXPECT_WIN32(GetModuleFileNameA(nullptr, untouched, 0), 0u, ERROR_INSUFFICIENT_BUFFER);
+  EXPECT_WIN32(GetModuleFileNameA(reinterpret_cast<HMODULE>(0x1234), untouched, 16), 0u, ERROR_INVALID_HANDLE);
+  EXPECT_STREQ(untouched, "untouched");
 }
 
-TEST(GetModuleFileNameA, RefusesZeroSizeAndUnknownModules) {
-  char buffer[16] = "untouched";
-  SetLastError(kSentinel);
-  EXPECT_EQ(GetModuleFileNameA(nullptr, buffer, 0), 0u);
-  EXPECT_EQ(GetLastError(), ERROR_INSUFFICIENT_BUFFER);
-  EXPECT_STREQ(buffer, "untouched");
-  SetLastError(kSentinel);
-  EXPECT_EQ(GetModuleFileNameA(reinterpret_cast<HMODULE>(0x1234), buffer, sizeof buffer), 0u);
-  EXPECT_EQ(GetLastError(), ERROR_INVALID_HANDLE);
-  EXPECT_STREQ(buffer, "untouched");
-}
-
-class CreateDirectoryATest : public ::testing::Test {
- protected:
-  void SetUp() override {
-    char pattern[] = "/tmp/tw-kernel-XXXXXX";
-    ASSERT_NE(mkdtemp(pattern), nullptr);
-    root_ = pattern;
-  }
-  void TearDown() override { std::system(("rm -rf '" + root_ + "'").c_str()); }
-  std::string Win(const std::string& rel) { return win32::WindowsPathFromPosix(root_ + rel); }
-  std::string root_;
-};
+using CreateDirectoryATest = icctest::TempFolderTest;
 
 TEST_F(CreateDirectoryATest, CreatesTheLastComponentOnly) {
-  SetLastError(kSentinel);
-  EXPECT_TRUE(CreateDirectoryA(Win("/a").c_str(), nullptr));
-  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+  EXPECT_WIN32(CreateDirectoryA(Win("a").c_str(), nullptr), TRUE, ERROR_SUCCESS);
   struct stat st;
-  ASSERT_EQ(stat((root_ + "/a").c_str(), &st), 0);
+  ASSERT_EQ(stat(Posix("a").c_str(), &st), 0);
   EXPECT_TRUE(S_ISDIR(st.st_mode));
-
-  SetLastError(kSentinel);
-  EXPECT_FALSE(CreateDirectoryA(Win("/a").c_str(), nullptr));
-  EXPECT_EQ(GetLastError(), ERROR_ALREADY_EXISTS);
-
-  SetLastError(kSentinel);
-  EXPECT_FALSE(CreateDirectoryA(Win("/missing/b").c_str(), nullptr));
-  EXPECT_EQ(GetLastError(), ERROR_PATH_NOT_FOUND);
-
-  SetLastError(kSentinel);
-  EXPECT_TRUE(CreateDirectoryA((Win("/a") + "\\b\\").c_str(), nullptr));  // trailing backslash
-  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
-}
-
-TEST_F(CreateDirectoryATest, RefusesOtherDrivesNullAndOverlongPaths) {
-  SetLastError(kSentinel);
-  EXPECT_FALSE(CreateDirectoryA("C:\\temp", nullptr));
-  EXPECT_EQ(GetLastError(), ERROR_PATH_NOT_FOUND);
-  SetLastError(kSentinel);
-  EXPECT_FALSE(CreateDirectoryA(nullptr, nullptr));
-  EXPECT_EQ(GetLastError(), ERROR_PATH_NOT_FOUND);
-  SetLastError(kSentinel);
-  EXPECT_FALSE(CreateDirectoryA(Win("/" + std::string(300, 'd')).c_str(), nullptr));
-  EXPECT_EQ(GetLastError(), ERROR_FILENAME_EXCED_RANGE);
+  EXPECT_WIN32(CreateDirectoryA(Win("a").c_str(), nullptr), FALSE, ERROR_ALREADY_EXISTS);
+  EXPECT_WIN32(CreateDirectoryA(Win("missing/b").c_str(), nullptr), FALSE, ERROR_PATH_NOT_FOUND);
+  EXPECT_WIN32(CreateDirectoryA((Win("a") + "\\b\\").c_str(), nullptr), TRUE, ERROR_SUCCESS);
+  EXPECT_WIN32(CreateDirectoryA("C:\\temp", nullptr), FALSE, ERROR_PATH_NOT_FOUND);
+  EXPECT_WIN32(CreateDirectoryA(nullptr, nullptr), FALSE, ERROR_PATH_NOT_FOUND);
+  EXPECT_WIN32(CreateDirectoryA(Win(std::string(300, 'd')).c_str(), nullptr), FALSE, ERROR_FILENAME_EXCED_RANGE);
 }
 
 TEST(LastError, IsPerThread) {
@@ -128,6 +68,42 @@ TEST(LastError, IsPerThread) {
   }).join();
   EXPECT_EQ(seen, ERROR_SUCCESS);
   EXPECT_EQ(GetLastError(), 42u);
+}
+
+TEST(GlobalAlloc, RefusesMoveableUnknownFlagsAndAbsurdSizes) {
+  const struct {
+    UINT flags;
+    SIZE_T bytes;
+    DWORD error;
+  } cases[] = {
+      {GMEM_MOVEABLE, 16, ERROR_NOT_SUPPORTED},    {GMEM_MOVEABLE | GMEM_ZEROINIT, 16, ERROR_NOT_SUPPORTED},
+      {0x8000, 16, ERROR_INVALID_PARAMETER},       {GMEM_MODIFY, 16, ERROR_INVALID_PARAMETER},
+      {GPTR, ~SIZE_T{0}, ERROR_NOT_ENOUGH_MEMORY}, {GMEM_FIXED, ~SIZE_T{0} / 2, ERROR_NOT_ENOUGH_MEMORY},
+  };
+  for (const auto& c : cases) EXPECT_WIN32(GlobalAlloc(c.flags, c.bytes), nullptr, c.error);
+}
+
+TEST(GlobalAlloc, GivesAlignedWritableBlocksZeroedOnRequest) {
+  for (UINT flags : {UINT{GMEM_FIXED}, UINT{GPTR}, UINT{GMEM_FIXED | GMEM_NODISCARD | GMEM_SHARE}}) {
+    for (SIZE_T bytes : {SIZE_T{0}, SIZE_T{13}, SIZE_T{4096}}) {
+      SetLastError(kSentinel);
+      auto* p = static_cast<unsigned char*>(GlobalAlloc(flags, bytes));
+      ASSERT_NE(p, nullptr);
+      EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+      EXPECT_EQ(reinterpret_cast<std::uintptr_t>(p) % 8, 0u);
+      for (SIZE_T i = 0; (flags & GMEM_ZEROINIT) && i < bytes; ++i) ASSERT_EQ(p[i], 0) << i;
+      std::memset(p, 0xA5, bytes);
+      EXPECT_WIN32(GlobalFree(p), nullptr, ERROR_SUCCESS);
+    }
+  }
+}
+
+TEST(GlobalFree, ReturnsTheHandleWhenItIsNotALiveBlock) {
+  void* p = GlobalAlloc(GPTR, 32);
+  ASSERT_EQ(GlobalFree(p), nullptr);
+  int on_stack = 0;
+  for (void* bad : {p, static_cast<void*>(&on_stack)}) EXPECT_WIN32(GlobalFree(bad), bad, ERROR_INVALID_HANDLE);
+  EXPECT_WIN32(GlobalFree(nullptr), nullptr, ERROR_SUCCESS);
 }
 
 }  // namespace

@@ -5,31 +5,26 @@
 
 #include <lcms2.h>
 
+#include <cmath>
 #include <cstdint>
 #include <string>
 #include <vector>
 
-#include "icm.h"
-#include "win32_paths.h"
+#include "icc_test_support.h"
 
 namespace transform_test {
 
-constexpr DWORD kSentinel = 0xDEADBEEF;
+using icctest::IccPath;
+using icctest::kSentinel;
 constexpr DWORD kRel = INTENT_RELATIVE_COLORIMETRIC;
 
-inline std::string IccPath(const std::string& name) { return std::string(TINTWELL_ICC_DIR) + "/" + name; }
+inline WORD Word(double v) { return static_cast<WORD>(std::lround(std::fmin(std::fmax(v, 0.0), 1.0) * 65535.0)); }
 
 class Profile {
  public:
-  explicit Profile(const std::string& name) {
-    const std::string path = win32::WindowsPathFromPosix(IccPath(name));
-    PROFILE p{PROFILE_FILENAME, const_cast<char*>(path.c_str()), static_cast<DWORD>(path.size())};
-    handle_ = OpenColorProfileA(&p, PROFILE_READ, FILE_SHARE_READ, OPEN_EXISTING);
-  }
-  explicit Profile(std::vector<std::uint8_t> bytes) {
-    PROFILE p{PROFILE_MEMBUFFER, bytes.data(), static_cast<DWORD>(bytes.size())};
-    handle_ = OpenColorProfileA(&p, PROFILE_READ, 0, OPEN_EXISTING);
-  }
+  explicit Profile(const std::string& name)
+      : handle_(icctest::OpenPath(win32::WindowsPathFromPosix(IccPath(name)), PROFILE_READ, OPEN_EXISTING)) {}
+  explicit Profile(const std::vector<std::uint8_t>& bytes) : handle_(icctest::OpenMemory(bytes, PROFILE_READ)) {}
   ~Profile() { CloseColorProfile(handle_); }
   Profile(const Profile&) = delete;
   Profile& operator=(const Profile&) = delete;
@@ -57,13 +52,13 @@ class Xform {
 class LcmsChain {
  public:
   LcmsChain(const std::vector<std::string>& names, std::vector<cmsUInt32Number> intents, cmsUInt32Number in,
-            cmsUInt32Number out, cmsUInt32Number flags = 0) {
+            cmsUInt32Number out) {
     std::vector<cmsHPROFILE> profiles;
     for (const std::string& n : names) profiles.push_back(cmsOpenProfileFromFile(IccPath(n).c_str(), "r"));
     std::vector<cmsBool> bpc(names.size(), FALSE);
     std::vector<cmsFloat64Number> adaptation(names.size(), 1.0);
     x_ = cmsCreateExtendedTransform(nullptr, static_cast<cmsUInt32Number>(names.size()), profiles.data(),
-                                    bpc.data(), intents.data(), adaptation.data(), nullptr, 0, in, out, flags);
+                                    bpc.data(), intents.data(), adaptation.data(), nullptr, 0, in, out, 0);
     for (cmsHPROFILE p : profiles) cmsCloseProfile(p);
   }
   ~LcmsChain() { cmsDeleteTransform(x_); }
@@ -75,22 +70,18 @@ class LcmsChain {
   cmsHTRANSFORM x_ = nullptr;
 };
 
-inline std::vector<std::uint8_t> SaveToMemory(cmsHPROFILE profile) {
-  cmsUInt32Number size = 0;
-  cmsSaveProfileToMem(profile, nullptr, &size);
-  std::vector<std::uint8_t> bytes(size);
-  cmsSaveProfileToMem(profile, bytes.data(), &size);
-  cmsCloseProfile(profile);
-  return bytes;
-}
-
 // A device link made by Little CMS applying one curve per channel.
 inline std::vector<std::uint8_t> CurveLink(cmsColorSpaceSignature space, int channels, double gamma) {
   cmsToneCurve* curve = cmsBuildGamma(nullptr, gamma);
   std::vector<cmsToneCurve*> curves(channels, curve);
   cmsHPROFILE link = cmsCreateLinearizationDeviceLink(space, curves.data());
   cmsFreeToneCurve(curve);
-  return SaveToMemory(link);
+  cmsUInt32Number size = 0;
+  cmsSaveProfileToMem(link, nullptr, &size);
+  std::vector<std::uint8_t> bytes(size);
+  cmsSaveProfileToMem(link, bytes.data(), &size);
+  cmsCloseProfile(link);
+  return bytes;
 }
 
 }  // namespace transform_test
