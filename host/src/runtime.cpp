@@ -79,7 +79,7 @@ struct EventBinding;
 
 struct host_ObjectExtras {
   std::string folderPath;  // for folder items
-  std::vector<std::unique_ptr<host::EventBinding>> events;
+  std::vector<std::shared_ptr<host::EventBinding>> events;
 };
 
 namespace host {
@@ -88,7 +88,9 @@ using ClassEntry = host_ClassEntry;
 
 namespace {
 
-struct EventBinding {
+// A handler may replace or remove itself while it runs, so the trampoline holds its
+// binding (and with it the closure being executed) until the call returns.
+struct EventBinding : std::enable_shared_from_this<EventBinding> {
   Runtime::Impl* runtime = nullptr;
   REALobject object = nullptr;
   intptr_t eventId = 0;
@@ -563,7 +565,7 @@ extern "C" void* ResolveEntry(const char* name) {
 
 // Routes a libffi closure call to the script's handler.
 void EventTrampoline(ffi_cif*, void* ret, void** args, void* user) {
-  auto* b = static_cast<EventBinding*>(user);
+  const std::shared_ptr<EventBinding> b = static_cast<EventBinding*>(user)->shared_from_this();
   Runtime::Impl& rt = *b->runtime;
   const Object self = Object::Retain(*static_cast<REALobject*>(args[0]));
   std::vector<Value> values;
@@ -735,7 +737,7 @@ void Runtime::SetEventHandler(const Object& self, const std::string& event, Even
       break;
     }
   if (!handler) return;
-  auto b = std::make_unique<EventBinding>();
+  auto b = std::make_shared<EventBinding>();
   b->runtime = impl_.get();
   b->object = self.get();
   b->eventId = id;

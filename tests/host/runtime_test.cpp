@@ -157,6 +157,21 @@ TEST_F(RuntimeTest, EventsReachTheScriptsHandlerWithTheirArguments) {
   EXPECT_THROW(rt->SetEventHandler(p, "Pong", nullptr), HostError);
 }
 
+TEST_F(RuntimeTest, AHandlerMayRemoveItselfWhileItRuns) {
+  Object p = rt->New("Probe");
+  int calls = 0;
+  rt->SetEventHandler(p, "Ping", [&](const Object& self, const std::vector<Value>& args) {
+    ++calls;
+    rt->SetEventHandler(self, "Ping", nullptr);
+    return Value(args[0].AsInteger());  // the binding must outlive its own removal
+  });
+  rt->Call(p, "Fire", {5});
+  EXPECT_EQ(rt->Get(p, "n").AsInteger(), 5);
+  rt->Call(p, "Fire", {6});
+  EXPECT_EQ(calls, 1);
+  EXPECT_EQ(rt->Get(p, "n").AsInteger(), -999);
+}
+
 TEST_F(RuntimeTest, DestructorRunsWhenTheLastReferenceGoes) {
   {
     Object a = rt->New("Probe");
