@@ -102,8 +102,8 @@ struct Job {
   }
 };
 
-unsigned Workers(size_t pixels, bool may_share) {
-  if (!may_share || pixels < kBitmapThreadingPixels) return 1;
+unsigned Workers(size_t pixels) {
+  if (pixels < kBitmapThreadingPixels) return 1;
   unsigned n = std::max(1u, std::thread::hardware_concurrency());
   const unsigned limit = thread_limit.load();
   if (limit) n = std::min(n, limit);
@@ -152,20 +152,20 @@ extern "C" BOOL WINAPI TranslateBitmapBits(HTRANSFORM hColorTransform, PVOID pSr
     auto* dst = static_cast<uint8_t*>(pDestBits);
     const uintptr_t s0 = reinterpret_cast<uintptr_t>(src), d0 = reinterpret_cast<uintptr_t>(dst);
     const bool overlap = s0 < d0 + out_extent && d0 < s0 + in_extent;
-    const bool in_place = overlap && src == dst && out->bytes <= in->bytes && out_stride <= in_stride;
+    // In place is safe only row onto the same row, pixel onto a pixel no larger: Little
+    // CMS copies the x bytes of every row of a call before it converts any colour.
+    const bool in_place = overlap && src == dst && out->bytes <= in->bytes && out_stride == in_stride;
     std::vector<uint8_t> copy;
     if (overlap && !in_place) {
-      // The output would overtake rows not yet read: convert from a copy.
+      // The output would overtake bytes not yet read: convert from a copy.
       copy.assign(src, src + in_extent);
       src = copy.data();
     }
-    // In place, rows are independent only when they start at the same offsets.
-    const bool may_share = !in_place || out_stride == in_stride;
     const Job job{x, src, dst, dwWidth, static_cast<size_t>(in_stride), static_cast<size_t>(out_stride),
                   out->bytes, out->x && !in->x};
 
     const size_t height = dwHeight;
-    const unsigned workers = Workers(size_t{dwWidth} * height, may_share);
+    const unsigned workers = Workers(size_t{dwWidth} * height);
     const size_t band = std::max<size_t>(1, kBandPixels / dwWidth);
     for (size_t first = 0; first < height; first += band) {
       const size_t rows = std::min(band, height - first);
