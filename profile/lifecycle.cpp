@@ -80,8 +80,17 @@ void SaveTo(ProfileData* d, const char* destination, const char* trace, bool tra
     SetCMError(kErrorInvalidObject);
     return;
   }
-  CloseColorProfile(d->profile);
+  // Closing writes the edits into the working copy; if that fails, copying the stale
+  // copy would report a save that did not happen.
+  const BOOL written = CloseColorProfile(d->profile);
   d->profile = 0;
+  if (!written) {
+    const DWORD code = GetLastError();
+    SendDebugString("Error writing profile");
+    SetCMError(static_cast<int32_t>(code));
+    d->profile = OpenByFullPath(d->tempPath);
+    return;
+  }
   SendDebugString(trace);
   SendDebugString(d->tempPath);
   SendDebugString(destination);

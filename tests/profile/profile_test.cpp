@@ -1,5 +1,6 @@
 // Profile objects on real files: working copies, saving, and the header properties.
 #include <algorithm>
+#include <cstdio>
 #include <cstring>
 
 #include "plugin_fixture.h"
@@ -46,6 +47,25 @@ TEST_F(ProfileTest, DestroyingWithoutSavingKeepsTheFileAndDeletesTheCopy) {
   }
   EXPECT_EQ(ProfileFiles::Read(f), original);
   EXPECT_FALSE(ProfileFiles::Exists(ProfileFiles::PluginTempFolder() + "0"));
+}
+
+TEST_F(ProfileTest, ASaveWhoseWriteFailsIsReportedAndLeavesTheFileAlone) {
+  const std::string f = files.Copy("sRGB.icc", "a.icc");
+  const auto original = ProfileFiles::Read(f);
+  const std::string temp = ProfileFiles::PluginTempFolder();
+  const std::string moved = temp.substr(0, temp.size() - 1) + ".moved";
+  Object p = Open(f);
+  rt->Set(p, "Model", 42);
+  // Without its folder the working copy cannot be written back.
+  ASSERT_EQ(std::rename(temp.c_str(), moved.c_str()), 0);
+  Object d = Debugger();
+  rt->Call(p, "SaveProfile");
+  const int32_t code = Error();
+  ASSERT_EQ(std::rename(moved.c_str(), temp.c_str()), 0);
+  EXPECT_EQ(code, 3);  // ERROR_PATH_NOT_FOUND
+  EXPECT_NE(std::find(log.entries.begin(), log.entries.end(), "DebugString:Error writing profile"), log.entries.end());
+  EXPECT_EQ(std::find(log.entries.begin(), log.entries.end(), "DebugString:saveprofile"), log.entries.end());
+  EXPECT_EQ(ProfileFiles::Read(f), original);
 }
 
 TEST_F(ProfileTest, SaveProfileAsLeavesTheObjectOnItsOwnFile) {
