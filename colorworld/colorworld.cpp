@@ -27,6 +27,12 @@ bool Usable(REALobject profile) {
   return handle && IsColorProfileValid(handle, &valid) && valid;
 }
 
+// The colour type a chain takes in from its first profile: a named-colour profile takes
+// colour indexes, whatever data colour space it names.
+COLORTYPE InputTypeFor(const PROFILEHEADER& first) {
+  return first.phClass == CLASS_NAMED ? COLOR_NAMED : ColorTypeForSpace(first.phDataColorSpace);
+}
+
 // How a concatenation reads each header: through ReadProfileHeader (with its trace and
 // error report) or quietly, where a failed read counts as a zeroed header.
 enum class HeaderRead { Reported, Quiet };
@@ -47,9 +53,8 @@ void Concatenate(ColorWorldData* d, int32_t keyindex, REALobject const profiles[
     }
     handles[count] = handle;
     intents[count] = header.phRenderingIntent;
-    const COLORTYPE type = ColorTypeForSpace(header.phDataColorSpace);
-    if (count == 0) d->inType = static_cast<uint8_t>(type);
-    d->outType = static_cast<uint8_t>(type);
+    if (count == 0) d->inType = static_cast<uint8_t>(InputTypeFor(header));
+    d->outType = static_cast<uint8_t>(ColorTypeForSpace(header.phDataColorSpace));
     ++count;
   }
   d->transform = CreateMultiProfileTransform(handles, count, intents, count, BEST_MODE, static_cast<DWORD>(keyindex));
@@ -82,7 +87,7 @@ void ConstructFromPair(REALobject self, REALobject src, REALobject dest) {
   PROFILEHEADER source, destination;
   ReadProfileHeader(ProfileHandle(src), &source);
   ReadProfileHeader(ProfileHandle(dest), &destination);
-  d->inType = static_cast<uint8_t>(ColorTypeForSpace(source.phDataColorSpace));
+  d->inType = static_cast<uint8_t>(InputTypeFor(source));
   d->outType = static_cast<uint8_t>(ColorTypeForSpace(destination.phDataColorSpace));
   HPROFILE handles[2] = {ProfileHandle(src), ProfileHandle(dest)};
   DWORD intents[2] = {source.phRenderingIntent, destination.phRenderingIntent};

@@ -23,9 +23,10 @@ ColorAccess AccessForSpace(const std::string& space) {
       for (int i = 1; i <= n; ++i) a.names.push_back(std::to_string(i));
       return a;
     }
-  if (space == "nmcl") return {Kind::Named, {"index"}, "named-colour index from 1"};
   return {Kind::Properties, {"rr", "rg", "rb"}, "R G B 0-255"};
 }
+
+ColorAccess NamedColorAccess() { return {ColorAccess::Kind::Named, {"index"}, "named-colour index from 1"}; }
 
 namespace {
 const char* ChannelMethod(std::size_t channels, bool set) {

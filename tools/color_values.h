@@ -19,6 +19,8 @@ struct ColorAccess {
 // The accessors for an ICC data colour space signature as the ColorSpace property
 // reads it ("RGB ", "CMYK", "Lab ", ...).
 ColorAccess AccessForSpace(const std::string& space);
+// The accessor for the colour indexes a named-colour profile takes in.
+ColorAccess NamedColorAccess();
 
 void WriteColor(host::Runtime& rt, const host::Object& color, const ColorAccess& access,
                 const std::vector<double>& values);

@@ -147,7 +147,9 @@ int ConvertCommand(Session& session, const std::vector<std::string>& args, const
     rt.Set(src, "RenderIntent", options.intent);
     rt.Set(dst, "RenderIntent", options.intent);
   }
-  const ColorAccess in = AccessForSpace(SpaceOf(session, src));
+  // A named-colour profile takes colour indexes, whatever space its colours are in.
+  const bool named = rt.Get(src, "Type").AsString() == "nmcl";
+  const ColorAccess in = named ? NamedColorAccess() : AccessForSpace(SpaceOf(session, src));
   const ColorAccess out = AccessForSpace(SpaceOf(session, dst));
 
   host::Object world;
@@ -220,6 +222,10 @@ int GamutCommand(Session& session, const std::vector<std::string>& args, const O
   host::Object world = rt.New("ColorWorld", {lab, profile});
   session.Check("cannot build a colour world for " + args[0]);
   const double l = ParseNumber(args[1]), a = ParseNumber(args[2]), b = ParseNumber(args[3]);
+  // The check encodes Lab in 16-bit words, which wrap outside these ranges.
+  if (!(l >= 0 && l <= 65535 / 652.8) || !(a >= -128 && a <= 65535 / 256.0 - 128) ||
+      !(b >= -128 && b <= 65535 / 256.0 - 128))
+    throw UsageError("L must lie in 0-100.39, a and b in -128-127.99");
   const bool inside = rt.Call(world, "CheckLAB", {l, a, b}).AsBoolean();
   if (options.json)
     std::printf("{\"L\": %s, \"a\": %s, \"b\": %s, \"inGamut\": %s}\n", Number(l).c_str(), Number(a).c_str(),

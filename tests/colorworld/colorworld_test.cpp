@@ -191,6 +191,7 @@ class LcmsChain {
     cmsDoTransform(transform_, in.data(), out.data(), 1);
     return out;
   }
+  void RunRaw(const void* in, void* out) const { cmsDoTransform(transform_, in, out, 1); }
   bool ok() const { return transform_ != nullptr; }
 
  private:
@@ -225,6 +226,27 @@ TEST_F(ColorWorldTest, MatchesLittleCmsInDoublePrecision) {
       EXPECT_NEAR(D(color, "la"), expected[1], 0.01) << c[0] << " " << c[1] << " " << c[2];
       EXPECT_NEAR(D(color, "lb"), expected[2], 0.01) << c[0] << " " << c[1] << " " << c[2];
     }
+  }
+}
+
+TEST_F(ColorWorldTest, ANamedColourProfileTakesColourIndexes) {
+  Object names = Open("colord/x11-colors.icc");
+  Object srgb = Open("sRGB.icc");
+  Object w = rt->New("ColorWorld", {names, srgb});
+  ASSERT_EQ(Error(), 0);
+  const LcmsChain expected({"colord/x11-colors.icc", "sRGB.icc"}, TYPE_NAMED_COLOR_INDEX, TYPE_RGB_DBL);
+  ASSERT_TRUE(expected.ok());
+  for (int index : {1, 2, 50}) {
+    Object color = rt->New("CMColor");
+    rt->Set(color, "namedindex", index);
+    rt->Call(w, "MatchCMcolor", {color});
+    EXPECT_EQ(Error(), 0) << index;
+    cmsUInt16Number zeroBased = static_cast<cmsUInt16Number>(index - 1);
+    std::vector<double> want(3);
+    expected.RunRaw(&zeroBased, want.data());
+    EXPECT_NEAR(D(color, "rr"), want[0] * 255, 0.01) << index;
+    EXPECT_NEAR(D(color, "rg"), want[1] * 255, 0.01) << index;
+    EXPECT_NEAR(D(color, "rb"), want[2] * 255, 0.01) << index;
   }
 }
 

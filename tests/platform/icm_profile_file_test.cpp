@@ -58,11 +58,10 @@ TEST_F(ProfileFiles, ChangesReachTheFileAtCloseOnly) {
 
 TEST_F(ProfileFiles, ReadOnlyAndUnchangedHandlesNeverWrite) {
   const std::string path = CopyOf("Gray.icc", "g.icc");
+  // A read-only file refuses a read-write open, even to root.
   ASSERT_EQ(chmod(Posix("g.icc").c_str(), 0444), 0);
-  if (access(Posix("g.icc").c_str(), W_OK) != 0) {  // not running as root
-    EXPECT_WIN32(OpenPath(path, PROFILE_READWRITE, OPEN_EXISTING), nullptr, ERROR_ACCESS_DENIED);
-  }
-  ASSERT_EQ(chmod(Posix("g.icc").c_str(), 0644), 0);
+  EXPECT_WIN32(OpenPath(path, PROFILE_READWRITE, OPEN_EXISTING), nullptr, ERROR_ACCESS_DENIED);
+  ASSERT_EQ(chmod(Posix("g.icc").c_str(), 0640), 0);
   struct stat before, after;
   ASSERT_EQ(stat(Posix("g.icc").c_str(), &before), 0);
   for (DWORD access : {PROFILE_READ, PROFILE_READWRITE}) {
@@ -74,6 +73,17 @@ TEST_F(ProfileFiles, ReadOnlyAndUnchangedHandlesNeverWrite) {
   }
   ASSERT_EQ(stat(Posix("g.icc").c_str(), &after), 0);
   EXPECT_EQ(after.st_ino, before.st_ino) << "an unchanged profile is not rewritten";
+
+  // A changed one is rewritten with the permissions it had.
+  HPROFILE h = OpenPath(path, PROFILE_READWRITE, OPEN_EXISTING);
+  PROFILEHEADER header;
+  ASSERT_TRUE(GetColorProfileHeader(h, &header));
+  header.phModel = 7;
+  ASSERT_TRUE(SetColorProfileHeader(h, &header));
+  ASSERT_TRUE(CloseColorProfile(h));
+  ASSERT_EQ(stat(Posix("g.icc").c_str(), &after), 0);
+  EXPECT_NE(after.st_ino, before.st_ino);
+  EXPECT_EQ(after.st_mode & 07777, 0640u);
 }
 
 TEST(MemoryProfiles, NeverTouchTheCallersBuffer) {

@@ -35,7 +35,8 @@ TEST(Tool, HelpAndUsageErrors) {
   EXPECT_NE(r.out.find("usage: tintwell"), std::string::npos);
   EXPECT_NE(r.out.find("srgb"), std::string::npos);
   for (const char* bad : {"", "frobnicate", "--bogus info", "convert srgb", "--intent 7 convert srgb lab 1 2 3",
-                          "convert srgb lab 1 2", "convert srgb lab 1 2 x", "gamut srgb 50 0", "list extra"}) {
+                          "convert srgb lab 1 2", "convert srgb lab 1 2 x", "gamut srgb 50 0", "gamut srgb 120 0 0",
+                          "gamut srgb 50 0 128", "list extra"}) {
     r = RunTool(bad);
     EXPECT_EQ(r.status, 2) << bad;
     EXPECT_TRUE(r.out.empty()) << bad;
@@ -58,6 +59,10 @@ TEST(Tool, ConvertsColoursFromArgumentsAndInput) {
   r = RunTool("--json convert srgb cmyk 255 255 255");
   ASSERT_EQ(r.status, 0) << r.err;
   EXPECT_EQ(r.out, "[\n  {\"in\": [255, 255, 255], \"out\": [0, 0, 0, 0]}\n]\n");
+  // A named-colour profile takes colour indexes: x11's first colour is LightPink.
+  r = RunTool("convert " TINTWELL_ICC_DIR "/colord/x11-colors.icc srgb 1");
+  ASSERT_EQ(r.status, 0) << r.err;
+  EXPECT_EQ(r.out.substr(0, 8), "255 182.");
   // Through a profile between, and with another intent: white stays white, which the
   // gray accessor reads as 0 (it counts darkness).
   r = RunTool("--via lab --intent 1 convert srgb gray 255 255 255");

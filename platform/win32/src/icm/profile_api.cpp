@@ -14,6 +14,7 @@
 #include "icm/icc_container.h"
 #include "icm/profile_store.h"
 #include "icm/profile_validity.h"
+#include "kernel/file_paths.h"
 #include "kernel/atomic_file.h"
 #include "kernel/errno_map.h"
 
@@ -73,8 +74,8 @@ DWORD OpenFile(const char* name, DWORD creation, OpenProfile& profile) {
     if (stat(folder.c_str(), &st) != 0 || !S_ISDIR(st.st_mode)) return ERROR_PATH_NOT_FOUND;
     if (creation == OPEN_EXISTING || creation == TRUNCATE_EXISTING) return ERROR_FILE_NOT_FOUND;
     if (profile.writable && access(folder.c_str(), W_OK) != 0) return ErrorFromErrno(errno);
-  } else if (profile.writable && access(profile.path.c_str(), W_OK) != 0) {
-    return ErrorFromErrno(errno);
+  } else if (profile.writable && (IsReadOnlyMode(st.st_mode) || access(profile.path.c_str(), W_OK) != 0)) {
+    return ERROR_ACCESS_DENIED;
   }
 
   if (exists && (creation == OPEN_EXISTING || creation == OPEN_ALWAYS)) {

@@ -32,7 +32,11 @@ DWORD WriteFileAtomically(const std::string& posixPath, const void* data, std::s
     left -= static_cast<std::size_t>(n);
   }
   if (err == 0 && fsync(fd) != 0) err = errno;
-  if (err == 0 && fchmod(fd, 0644) != 0) err = errno;
+  // A replaced file keeps its permissions; a new one is readable by all.
+  struct stat existing;
+  mode_t mode = 0644;
+  if (stat(posixPath.c_str(), &existing) == 0) mode = existing.st_mode & 07777;
+  if (err == 0 && fchmod(fd, mode) != 0) err = errno;
   if (close(fd) != 0 && err == 0) err = errno;
   if (err == 0 && rename(name.data(), posixPath.c_str()) != 0) err = errno;
   if (err != 0) {
