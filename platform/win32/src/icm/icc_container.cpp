@@ -139,9 +139,13 @@ DWORD IccContainer::ResizeElement(std::uint32_t signature, std::size_t size) {
     RebuildIndex();
   } else {
     // The file must stay addressable with 32-bit offsets and sizes.
-    const std::uint64_t old = it == index_.end() ? 0 : tags_[it->second].data->size();
-    if (size > kMaxFileSize || SerializedSize() + kTagEntrySize + AlignUp4(size) - old > kMaxFileSize)
-      return ERROR_NOT_ENOUGH_MEMORY;
+    // A shared block stays in the file for its other entries, so only an own block's
+    // bytes are given back.
+    const bool exists = it != index_.end();
+    const bool own = exists && tags_[it->second].data.use_count() == 1;
+    const std::uint64_t freed = own ? AlignUp4(tags_[it->second].data->size()) : 0;
+    const std::uint64_t added = (exists ? 0 : kTagEntrySize) + AlignUp4(size);
+    if (size > kMaxFileSize || SerializedSize() + added - freed > kMaxFileSize) return ERROR_NOT_ENOUGH_MEMORY;
     if (it == index_.end()) {
       tags_.push_back(Tag{signature, std::make_shared<Block>(size)});
       index_[signature] = tags_.size() - 1;

@@ -6,6 +6,7 @@
 #include <cerrno>
 #include <cstring>
 #include <memory>
+#include <mutex>
 #include <string>
 
 #include "handle_table.h"
@@ -25,10 +26,25 @@ namespace {
 static_assert(sizeof(PROFILEHEADER) == kHeaderSize, "PROFILEHEADER must mirror the ICC header");
 
 struct OpenProfile {
+  std::mutex mutex;  // one call at a time on a profile, from any thread
   IccContainer icc;
   bool writable = false;
   std::string path;  // empty for a memory profile
   bool changed = false;
+};
+
+// An open profile held and locked for the length of one call; empty for a bad handle.
+class LockedProfile {
+ public:
+  explicit LockedProfile(std::shared_ptr<OpenProfile> profile) : profile_(std::move(profile)) {
+    if (profile_) lock_ = std::unique_lock<std::mutex>(profile_->mutex);
+  }
+  explicit operator bool() const { return profile_ != nullptr; }
+  OpenProfile* operator->() const { return profile_.get(); }
+
+ private:
+  std::shared_ptr<OpenProfile> profile_;
+  std::unique_lock<std::mutex> lock_;
 };
 
 BOOL Fail(DWORD code) {
@@ -52,8 +68,8 @@ auto Guarded(Body&& body) -> decltype(body()) {
   }
 }
 
-std::shared_ptr<OpenProfile> Lookup(HPROFILE handle) {
-  return Handles().Lookup<OpenProfile>(handle, HandleKind::Profile);
+LockedProfile Lookup(HPROFILE handle) {
+  return LockedProfile(Handles().Lookup<OpenProfile>(handle, HandleKind::Profile));
 }
 
 // Opens a file profile per the creation mode; a missing file (or a mode that replaces
@@ -138,7 +154,7 @@ extern "C" HPROFILE WINAPI OpenColorProfileA(PPROFILE pProfile, DWORD dwDesiredA
 // when the write fails; the failure is then reported with the file's error code.
 extern "C" BOOL WINAPI CloseColorProfile(HPROFILE hProfile) {
   return Guarded([&]() -> BOOL {
-    auto profile = win32::Handles().Remove<OpenProfile>(hProfile, win32::HandleKind::Profile);
+    const LockedProfile profile(win32::Handles().Remove<OpenProfile>(hProfile, win32::HandleKind::Profile));
     if (!profile) return Fail(ERROR_INVALID_HANDLE);
     if (profile->writable && profile->changed && !profile->path.empty()) {
       const std::vector<std::uint8_t> bytes = profile->icc.Serialize();

@@ -79,7 +79,8 @@ DWORD Chain::Build(const HPROFILE* handles, DWORD count, const DWORD* intents, D
       if (i != 0 || count == 1) return i != 0 ? ERROR_COLORSPACE_MISMATCH : ERROR_INVALID_PARAMETER;
       auto* list = static_cast<cmsNAMEDCOLORLIST*>(cmsReadTag(p, cmsSigNamedColor2Tag));
       named_count_ = list ? cmsNamedColorCount(list) : 0;
-      if (named_count_ == 0) return ERROR_INVALID_PROFILE;
+      // Little CMS takes the index as a 16-bit word: a longer list could not be reached.
+      if (named_count_ == 0 || named_count_ > 0xFFFF) return ERROR_INVALID_PROFILE;
       step.out = cmsSigLabData;
     } else if (!forwards && i > 0 && IsPcsSpace(current)) {
       std::swap(step.in, step.out);
