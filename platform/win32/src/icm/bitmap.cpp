@@ -116,6 +116,7 @@ void SetBitmapThreadLimit(unsigned limit) { thread_limit = limit; }
 
 }  // namespace win32::icm
 
+using namespace win32;
 using namespace win32::icm;
 
 extern "C" BOOL WINAPI TranslateBitmapBits(HTRANSFORM hColorTransform, PVOID pSrcBits, BMFORMAT bmInput,

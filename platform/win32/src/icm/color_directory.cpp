@@ -1,5 +1,8 @@
 #include "icm/color_directory.h"
 
+#include "api_result.h"
+#include "icm/icc_container.h"
+
 #include <fcntl.h>
 #include <pwd.h>
 #include <sys/stat.h>
@@ -98,7 +101,7 @@ DWORD ReadFileBytes(const std::string& posixPath, std::vector<std::uint8_t>& byt
     result = ErrorFromErrno(errno);
   } else if (S_ISDIR(st.st_mode)) {
     result = ERROR_ACCESS_DENIED;
-  } else if (static_cast<std::uint64_t>(st.st_size) > kMaxProfileFileSize) {
+  } else if (static_cast<std::uint64_t>(st.st_size) > kMaxProfileSize) {
     result = ERROR_INVALID_PROFILE;
   } else {
     try {
@@ -126,18 +129,9 @@ DWORD ReadFileBytes(const std::string& posixPath, std::vector<std::uint8_t>& byt
   return result;
 }
 
-namespace {
-
-BOOL Fail(DWORD code) {
-  SetLastError(code);
-  return FALSE;
-}
-
-}  // namespace
-
 }  // namespace win32::icm
 
-using win32::icm::Fail;
+using win32::Fail;
 
 extern "C" BOOL WINAPI GetColorDirectoryA(PCSTR pMachineName, PSTR pBuffer, PDWORD pdwSize) {
   try {

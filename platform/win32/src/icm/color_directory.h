@@ -22,9 +22,6 @@ DWORD EnsureDirectory(const std::string& posixPath);
 // created. Returns ERROR_SUCCESS or the Windows code of the failure.
 DWORD ResolveProfilePath(const std::string& name, std::string& posixPath);
 
-// Profiles are addressed with 32-bit sizes.
-constexpr std::uint64_t kMaxProfileFileSize = 0xFFFFFFFFu;
-
 // Reads a whole file. Returns ERROR_SUCCESS, ERROR_FILE_NOT_FOUND, ERROR_PATH_NOT_FOUND
 // (a missing folder), ERROR_ACCESS_DENIED (unreadable or a folder), ERROR_INVALID_PROFILE
 // (larger than a profile can be) or another Windows code. May throw std::bad_alloc.

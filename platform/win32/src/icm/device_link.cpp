@@ -25,6 +25,7 @@ struct LinkParts {
 }  // namespace
 }  // namespace win32::icm
 
+using namespace win32;
 using namespace win32::icm;
 
 extern "C" BOOL WINAPI CreateDeviceLinkProfile(PHPROFILE hProfile, DWORD nProfiles, PDWORD padwIntent,

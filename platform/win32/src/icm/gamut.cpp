@@ -178,6 +178,7 @@ BYTE GamutCheck::CheckRoundTrip(const cmsCIELab& target) const {
 
 }  // namespace win32::icm
 
+using namespace win32;
 using namespace win32::icm;
 
 extern "C" BOOL WINAPI CheckColors(HTRANSFORM hColorTransform, PCOLOR paInputColors, DWORD nColors,

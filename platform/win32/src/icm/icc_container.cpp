@@ -9,7 +9,6 @@ namespace win32::icm {
 
 namespace {
 
-constexpr std::uint64_t kMaxFileSize = std::numeric_limits<std::uint32_t>::max();
 
 std::uint64_t AlignUp4(std::uint64_t n) { return (n + 3) & ~std::uint64_t{3}; }
 
@@ -46,7 +45,7 @@ void Block::Resize(std::size_t size) {
 DWORD IccContainer::Parse(std::shared_ptr<const Bytes> bytes, IccContainer& out) {
   const std::uint8_t* data = bytes->data();
   const std::size_t size = bytes->size();
-  if (size < kMinProfileSize || size > kMaxFileSize) return ERROR_INVALID_PROFILE;
+  if (size < kMinProfileSize || size > kMaxProfileSize) return ERROR_INVALID_PROFILE;
   if (ReadBE32(data + kOffsetSignature) != kSignatureAcsp) return ERROR_INVALID_PROFILE;
 
   // Bytes after a smaller declared size are not part of the profile; a larger declared
@@ -145,7 +144,7 @@ DWORD IccContainer::ResizeElement(std::uint32_t signature, std::size_t size) {
     const bool own = exists && tags_[it->second].data.use_count() == 1;
     const std::uint64_t freed = own ? AlignUp4(tags_[it->second].data->size()) : 0;
     const std::uint64_t added = (exists ? 0 : kTagEntrySize) + AlignUp4(size);
-    if (size > kMaxFileSize || SerializedSize() + added - freed > kMaxFileSize) return ERROR_NOT_ENOUGH_MEMORY;
+    if (size > kMaxProfileSize || SerializedSize() + added - freed > kMaxProfileSize) return ERROR_NOT_ENOUGH_MEMORY;
     if (it == index_.end()) {
       tags_.push_back(Tag{signature, std::make_shared<Block>(size)});
       index_[signature] = tags_.size() - 1;
@@ -174,7 +173,7 @@ std::uint64_t IccContainer::SerializedSize() const {
 
 Bytes IccContainer::Serialize() const {
   const std::uint64_t total = SerializedSize();
-  if (total > kMaxFileSize) throw std::bad_alloc();
+  if (total > kMaxProfileSize) throw std::bad_alloc();
   Bytes out(header_.begin(), header_.end());
   out.resize(static_cast<std::size_t>(total), 0);
   WriteBE32(out.data() + kOffsetSize, static_cast<std::uint32_t>(total));

@@ -19,6 +19,7 @@ namespace win32::icm {
 constexpr std::size_t kHeaderSize = 128;
 constexpr std::size_t kTagEntrySize = 12;
 constexpr std::size_t kMinProfileSize = kHeaderSize + 4;  // header and tag count
+constexpr std::uint64_t kMaxProfileSize = 0xFFFFFFFFu;     // sizes and offsets are 32-bit
 constexpr std::uint32_t kSignatureAcsp = 0x61637370;       // 'acsp'
 constexpr std::size_t kOffsetSize = 0;
 constexpr std::size_t kOffsetVersion = 8;

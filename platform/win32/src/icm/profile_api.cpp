@@ -9,6 +9,7 @@
 #include <mutex>
 #include <string>
 
+#include "api_result.h"
 #include "handle_table.h"
 #include "icm.h"
 #include "icm/color_directory.h"
@@ -46,16 +47,6 @@ class LockedProfile {
   std::shared_ptr<OpenProfile> profile_;
   std::unique_lock<std::mutex> lock_;
 };
-
-BOOL Fail(DWORD code) {
-  SetLastError(code);
-  return FALSE;
-}
-
-BOOL Succeed() {
-  SetLastError(ERROR_SUCCESS);
-  return TRUE;
-}
 
 // Runs an API body; allocation failure becomes ERROR_NOT_ENOUGH_MEMORY.
 template <class Body>
@@ -118,6 +109,7 @@ BOOL SerializeProfile(HPROFILE handle, std::vector<std::uint8_t>& bytes) {
 
 }  // namespace win32::icm
 
+using namespace win32;
 using namespace win32::icm;
 
 extern "C" HPROFILE WINAPI OpenColorProfileA(PPROFILE pProfile, DWORD dwDesiredAccess, DWORD dwShareMode,

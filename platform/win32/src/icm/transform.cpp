@@ -201,6 +201,7 @@ std::shared_ptr<Transform> FindTransform(HTRANSFORM handle) {
 
 }  // namespace win32::icm
 
+using namespace win32;
 using namespace win32::icm;
 
 extern "C" HTRANSFORM WINAPI CreateMultiProfileTransform(PHPROFILE pahProfiles, DWORD nProfiles, PDWORD padwIntent,

@@ -13,6 +13,7 @@
 #include <utility>
 #include <vector>
 
+#include "api_result.h"
 #include "icm.h"
 
 namespace win32::icm {
@@ -111,16 +112,6 @@ DWORD CheckInput(const Chain& chain, COLORTYPE type, const COLOR* colors, DWORD 
 
 // The double format for the chain's input as the colour codecs and named indexes fill it.
 cmsUInt32Number ChainInputFormat(const Chain& chain);
-
-inline BOOL Fail(DWORD code) {
-  SetLastError(code);
-  return FALSE;
-}
-
-inline BOOL Succeed() {
-  SetLastError(ERROR_SUCCESS);
-  return TRUE;
-}
 
 }  // namespace win32::icm
 
