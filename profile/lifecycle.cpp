@@ -35,10 +35,24 @@ void RefusePath(DWORD code) {
   CopyFailed();
 }
 
-void CloseIfOpen(ProfileData* d) {
-  if (!d->profile) return;
-  CloseColorProfile(d->profile);
-  d->profile = 0;
+// Removes the copy that the intent constructor installed in the colour directory.
+void UninstallCopy(ProfileData* d) {
+  if (!d->installed) return;
+  d->installed = false;
+  UninstallColorProfileA(nullptr, d->tempName, TRUE);
+}
+
+// Before a constructor runs again on an object: closes its profile and removes its
+// working copy, which nothing else can reach any more.
+void ReleasePrevious(ProfileData* d) {
+  if (d->profile) {
+    CloseColorProfile(d->profile);
+    d->profile = 0;
+  }
+  if (d->tempPath[0]) DeleteFileA(d->tempPath);
+  UninstallCopy(d);
+  d->tempPath[0] = '\0';
+  d->tempName[0] = '\0';
 }
 
 HPROFILE OpenByFullPath(const char* path) {
@@ -59,15 +73,16 @@ bool PreparePaths(ProfileData* d, REALfolderItem f) {
     RefusePath(ERROR_PATH_NOT_FOUND);
     return false;
   }
-  const char* name = d->tempPath + std::strlen(TempFolderPath);
+  const char* name = std::strrchr(d->tempPath, '\\') + 1;
   std::strncpy(d->tempName, name, sizeof d->tempName - 1);
   d->tempName[sizeof d->tempName - 1] = '\0';
   return true;
 }
 
-// Copies the own file to the working copy; reports a failure.
+// Copies the own file to the working copy; reports a failure. The copy is always the
+// plugin's own writable file, whatever the attributes of the file it copies.
 bool CopyToWorkingCopy(ProfileData* d) {
-  if (CopyFileA(d->path, d->tempPath, FALSE)) return true;
+  if (CopyFileA(d->path, d->tempPath, FALSE) && SetFileAttributesA(d->tempPath, FILE_ATTRIBUTE_NORMAL)) return true;
   ReportSystemError();
   CopyFailed();
   return false;
@@ -130,7 +145,7 @@ void ConstructFromFile(REALobject self, REALfolderItem f) {
   ProfileData* d = Data(self);
   SendDebugString(" ");
   SendDebugString("PROFILE - FILE CONSTRUCTOR");
-  CloseIfOpen(d);
+  ReleasePrevious(d);
   SetCMError(0);
   if (!PreparePaths(d, f) || !CopyToWorkingCopy(d)) return;
   ReportSystemError();
@@ -145,7 +160,7 @@ void ConstructFromFile(REALobject self, REALfolderItem f) {
 // handle, so that a later SaveProfile keeps them.
 void ConstructWithIntent(REALobject self, REALfolderItem f, int32_t intent, int32_t /*quality*/, REALstring cmm) {
   ProfileData* d = Data(self);
-  CloseIfOpen(d);
+  ReleasePrevious(d);
   SetCMError(0);
   if (!PreparePaths(d, f)) return;
   SendDebugString("TEMP PATH:");
@@ -166,6 +181,7 @@ void ConstructWithIntent(REALobject self, REALfolderItem f, int32_t intent, int3
     SetCMError(static_cast<int32_t>(code));
     return;
   }
+  d->installed = true;
   PROFILEHEADER header;
   if (!ReadProfileHeader(d->profile, &header)) return;  // never write a zeroed header back
   header.phRenderingIntent = static_cast<DWORD>(intent);
@@ -227,6 +243,7 @@ void Destruct(REALobject self) {
     SendDebugString("Could not delete file");
     SetCMError(static_cast<int32_t>(code));
   }
+  UninstallCopy(d);
 }
 
 REALfolderItem GetLocation(REALobject self, intptr_t) {

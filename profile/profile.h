@@ -12,6 +12,7 @@ struct ProfileData {
   char path[MAX_PATH];      // the profile's own file, written by SaveProfile
   char tempPath[MAX_PATH];  // the working copy: the temporary folder and tempName
   char tempName[36];        // the working copy's file name, a decimal counter value
+  bool installed;           // a copy named tempName was installed in the colour directory
 };
 
 extern REALclassDefinition ProfileClass;

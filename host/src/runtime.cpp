@@ -753,8 +753,9 @@ void Runtime::SetEventHandler(const Object& self, const std::string& event, Even
 }
 
 Object Runtime::MakeFolderItem(const std::string& posixPath) {
-  const std::string windows = win32::WindowsPathFromPosix(posixPath);
-  return Object::Adopt(EntryFolderItemFromPath(windows.c_str()));
+  const auto windows = win32::ExactWindowsPathFromPosix(posixPath);
+  if (!windows) throw HostError("a Windows path cannot name " + posixPath + " (a backslash in a name)");
+  return Object::Adopt(EntryFolderItemFromPath(windows->c_str()));
 }
 
 std::string Runtime::FolderItemPath(const Object& item) const {

@@ -13,6 +13,8 @@
 
 namespace {
 
+bool FileExists(const std::string& path) { return access(path.c_str(), F_OK) == 0; }
+
 using namespace icctest;
 
 class ProfileFiles : public TempFolderTest {};
@@ -332,6 +334,26 @@ TEST_F(ColorDirectory, InstallCopiesAndReplaces) {
   // Installing the installed copy itself leaves it as it is.
   EXPECT_WIN32(InstallColorProfileA(nullptr, win32::WindowsPathFromPosix(colorDir_ + "/Work 1.icc").c_str()), TRUE, ERROR_SUCCESS);
   EXPECT_EQ(ReadBytes(colorDir_ + "/Work 1.icc"), ReadBytes(IccPath("Gray.icc")));
+}
+
+TEST_F(ColorDirectory, UninstallDeletesOnlyWhenAskedAndOnlyInTheDirectory) {
+  const std::string path = CopyOf("sRGB.icc", "w.icc");
+  ASSERT_TRUE(InstallColorProfileA(nullptr, path.c_str()));
+  EXPECT_WIN32(UninstallColorProfileA("machine", "w.icc", TRUE), FALSE, ERROR_INVALID_PARAMETER);
+  EXPECT_WIN32(UninstallColorProfileA(nullptr, "", TRUE), FALSE, ERROR_INVALID_PARAMETER);
+  EXPECT_WIN32(UninstallColorProfileA(nullptr, "missing.icc", TRUE), FALSE, ERROR_FILE_NOT_FOUND);
+  EXPECT_WIN32(UninstallColorProfileA(nullptr, "w.icc", FALSE), TRUE, ERROR_SUCCESS);
+  EXPECT_TRUE(FileExists(colorDir_ + "/w.icc"));
+  // A full path names the installed copy by its file name; the original stays.
+  EXPECT_WIN32(UninstallColorProfileA(nullptr, path.c_str(), TRUE), TRUE, ERROR_SUCCESS);
+  EXPECT_FALSE(FileExists(colorDir_ + "/w.icc"));
+  EXPECT_TRUE(FileExists(Posix("w.icc")));
+}
+
+TEST_F(ProfileFiles, SpecialFilesAreNotProfiles) {
+  ASSERT_EQ(mkfifo(Posix("pipe").c_str(), 0666), 0);
+  for (const std::string& path : {Win("pipe"), std::string("Z:\\dev\\zero")})
+    EXPECT_WIN32(OpenPath(path, PROFILE_READ, OPEN_EXISTING), nullptr, ERROR_ACCESS_DENIED);
 }
 
 }  // namespace

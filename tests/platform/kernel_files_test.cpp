@@ -81,6 +81,8 @@ using CreateFileATest = FileTest;
 TEST_F(CopyFileATest, RefusesEachFailureWithItsCode) {
   Put("src", "source");
   Put("dst", "old");
+  ASSERT_EQ(mkfifo(Posix("fifo").c_str(), 0666), 0);
+  ASSERT_EQ(symlink("loop", Posix("loop").c_str()), 0);
   const struct {
     std::string from, to;
     BOOL failIfExists;
@@ -96,6 +98,11 @@ TEST_F(CopyFileATest, RefusesEachFailureWithItsCode) {
       {Win("src"), Win("dir"), FALSE, ERROR_ACCESS_DENIED},
       {"C:\\src", Win("new"), FALSE, ERROR_PATH_NOT_FOUND},
       {Win("src"), TooLong(), FALSE, ERROR_FILENAME_EXCED_RANGE},
+      // Only files are copied, and only onto files: a pipe would block, a device never ends.
+      {Win("fifo"), Win("new"), FALSE, ERROR_ACCESS_DENIED},
+      {"Z:\\dev\\zero", Win("new"), FALSE, ERROR_ACCESS_DENIED},
+      {Win("src"), Win("fifo"), FALSE, ERROR_ACCESS_DENIED},
+      {Win("src"), Win("loop"), FALSE, ERROR_CANT_RESOLVE_FILENAME},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.from + " -> " + c.to);
@@ -104,6 +111,38 @@ TEST_F(CopyFileATest, RefusesEachFailureWithItsCode) {
   EXPECT_WIN32(CopyFileA(nullptr, Win("new").c_str(), FALSE), FALSE, ERROR_PATH_NOT_FOUND);
   EXPECT_EQ(Get("dst"), "old");
   EXPECT_EQ(Get("ro"), "read-only");
+  EXPECT_EQ(Listing(), (std::set<std::string>{"src", "dst", "ro", "dir", "fifo", "loop"}));
+}
+
+// A copy onto a symbolic link replaces the link's target and keeps the link; a hard link
+// is replaced by a file of its own, since only a rename keeps the copy atomic.
+TEST_F(CopyFileATest, WritesThroughSymbolicLinksAndReplacesHardLinks) {
+  Put("src", "new");
+  mkdir(Posix("dir/sub").c_str(), 0777);
+  Put("dir/sub/real", "old");
+  Put("shared", "old");
+  ASSERT_EQ(symlink("dir/sub/real", Posix("relative").c_str()), 0);
+  ASSERT_EQ(symlink(Posix("relative").c_str(), Posix("chain").c_str()), 0);
+  ASSERT_EQ(symlink("made", Posix("dangling").c_str()), 0);
+  ASSERT_EQ(link(Posix("shared").c_str(), Posix("hard").c_str()), 0);
+  for (const char* target : {"chain", "dangling", "hard"}) {
+    SCOPED_TRACE(target);
+    EXPECT_WIN32(CopyFileA(Win("src").c_str(), Win(target).c_str(), FALSE), TRUE, ERROR_SUCCESS);
+  }
+  struct stat st;
+  for (const char* link : {"relative", "chain", "dangling"}) {
+    ASSERT_EQ(lstat(Posix(link).c_str(), &st), 0);
+    EXPECT_TRUE(S_ISLNK(st.st_mode)) << link;
+  }
+  EXPECT_EQ(Get("dir/sub/real"), "new");
+  EXPECT_EQ(Get("made"), "new");
+  EXPECT_EQ(Get("hard"), "new");
+  EXPECT_EQ(Get("shared"), "old");
+}
+
+TEST_F(CopyFileATest, NeverLeavesAStagedFileBeside) {
+  Put("src", std::string(100000, 's'));
+  for (int i = 0; i < 3; ++i) EXPECT_TRUE(CopyFileA(Win("src").c_str(), Win("dst").c_str(), FALSE));
   EXPECT_EQ(Listing(), (std::set<std::string>{"src", "dst", "ro", "dir"}));
 }
 
@@ -308,9 +347,9 @@ TEST_F(CreateFileATest, RefusesBadArgumentsFoldersAndReadOnlyFiles) {
 
 TEST_F(CreateFileATest, WriteFileWritesFromTheStartAndRefusesBadHandles) {
   Put("f", "hello");
-  HANDLE h = CreateFileA(Win("f").c_str(), GENERIC_WRITE, 0, nullptr, OPEN_EXISTING, 0, nullptr);
-  HANDLE readOnly =
-      CreateFileA(Win("f").c_str(), GENERIC_READ, 0, nullptr, OPEN_EXISTING, 0, nullptr);
+  const DWORD share = FILE_SHARE_READ | FILE_SHARE_WRITE;
+  HANDLE h = CreateFileA(Win("f").c_str(), GENERIC_WRITE, share, nullptr, OPEN_EXISTING, 0, nullptr);
+  HANDLE readOnly = CreateFileA(Win("f").c_str(), GENERIC_READ, share, nullptr, OPEN_EXISTING, 0, nullptr);
   ASSERT_NE(readOnly, INVALID_HANDLE_VALUE);
   DWORD n = kSentinel;
   char overlapped[32] = {};
@@ -330,6 +369,56 @@ TEST_F(CreateFileATest, WriteFileWritesFromTheStartAndRefusesBadHandles) {
     EXPECT_WIN32(CloseHandle(bad), FALSE, ERROR_INVALID_HANDLE);
   }
   EXPECT_EQ(Get("f"), "J" + big);
+}
+
+TEST_F(CreateFileATest, AHandleThatSharesNothingExcludesEveryOther) {
+  Put("f", "x");
+  const std::string f = Win("f");
+  const DWORD both = FILE_SHARE_READ | FILE_SHARE_WRITE;
+  HANDLE shared = CreateFileA(f.c_str(), GENERIC_READ, both, nullptr, OPEN_EXISTING, 0, nullptr);
+  ASSERT_NE(shared, INVALID_HANDLE_VALUE);
+  EXPECT_WIN32(CreateFileA(f.c_str(), GENERIC_READ, 0, nullptr, OPEN_EXISTING, 0, nullptr), INVALID_HANDLE_VALUE,
+               ERROR_SHARING_VIOLATION);
+  EXPECT_TRUE(CloseHandle(shared));
+  HANDLE exclusive = CreateFileA(f.c_str(), GENERIC_READ | GENERIC_WRITE, 0, nullptr, OPEN_EXISTING, 0, nullptr);
+  ASSERT_NE(exclusive, INVALID_HANDLE_VALUE);
+  for (DWORD share : {DWORD{0}, both})
+    EXPECT_WIN32(CreateFileA(f.c_str(), GENERIC_READ, share, nullptr, OPEN_EXISTING, 0, nullptr),
+                 INVALID_HANDLE_VALUE, ERROR_SHARING_VIOLATION);
+  // Another process meets the same refusal, and is let in once the owner has ended.
+  EXPECT_EXIT(_exit(CreateFileA(f.c_str(), GENERIC_READ, both, nullptr, OPEN_EXISTING, 0, nullptr) ==
+                            INVALID_HANDLE_VALUE && GetLastError() == ERROR_SHARING_VIOLATION ? 0 : 1),
+              ::testing::ExitedWithCode(0), "");
+  EXPECT_TRUE(CloseHandle(exclusive));
+  HANDLE again = CreateFileA(f.c_str(), GENERIC_READ, 0, nullptr, OPEN_EXISTING, 0, nullptr);
+  EXPECT_NE(again, INVALID_HANDLE_VALUE);
+  EXPECT_TRUE(CloseHandle(again));
+}
+
+TEST_F(FileTest, RemoveDirectoryAndSetFileAttributes) {
+  Put("dir/f", "x");
+  mkdir(Posix("empty").c_str(), 0777);
+  const struct {
+    std::string path;
+    DWORD code;
+  } removals[] = {
+      {Win("dir"), ERROR_DIR_NOT_EMPTY}, {Win("ro"), ERROR_DIRECTORY},   {Win("missing"), ERROR_FILE_NOT_FOUND},
+      {"C:\\dir", ERROR_PATH_NOT_FOUND}, {Win("empty"), ERROR_SUCCESS},
+  };
+  for (const auto& c : removals) {
+    SCOPED_TRACE(c.path);
+    EXPECT_WIN32(RemoveDirectoryA(c.path.c_str()), c.code == ERROR_SUCCESS ? TRUE : FALSE, c.code);
+  }
+  EXPECT_EQ(Listing(), (std::set<std::string>{"ro", "dir"}));
+
+  struct stat st;
+  EXPECT_WIN32(SetFileAttributesA(Win("ro").c_str(), FILE_ATTRIBUTE_NORMAL), TRUE, ERROR_SUCCESS);
+  ASSERT_EQ(stat(Posix("ro").c_str(), &st), 0);
+  EXPECT_EQ(st.st_mode & 0777, 0644u);
+  EXPECT_WIN32(SetFileAttributesA(Win("ro").c_str(), FILE_ATTRIBUTE_READONLY), TRUE, ERROR_SUCCESS);
+  ASSERT_EQ(stat(Posix("ro").c_str(), &st), 0);
+  EXPECT_EQ(st.st_mode & 0777, 0444u);
+  EXPECT_WIN32(SetFileAttributesA(Win("missing").c_str(), FILE_ATTRIBUTE_NORMAL), FALSE, ERROR_FILE_NOT_FOUND);
 }
 
 }  // namespace

@@ -17,6 +17,9 @@ TEST(Paths, DriveZIsThePosixRoot) {
   EXPECT_EQ(win32::PosixPathFromWindows("Z:\\"), "/");
   for (const char* bad : {"C:\\tmp\\a.icc", "tmp\\a.icc", "Z:", ""}) EXPECT_FALSE(win32::PosixPathFromWindows(bad));
   EXPECT_EQ(win32::WindowsPathFromPosix("/tmp/a b/c.icc"), "Z:\\tmp\\a b\\c.icc");
+  // A backslash in a POSIX name would come back as a separator, naming another file.
+  EXPECT_EQ(win32::ExactWindowsPathFromPosix("/tmp/a:b.icc"), "Z:\\tmp\\a:b.icc");
+  EXPECT_FALSE(win32::ExactWindowsPathFromPosix("/tmp/a\\b.icc"));
   const std::string relative = win32::WindowsPathFromPosix("x.icc");  // made absolute
   EXPECT_EQ(relative.rfind("Z:\\", 0), 0u);
   EXPECT_EQ(relative.substr(relative.size() - 6), "\\x.icc");

@@ -81,8 +81,8 @@ TEST_F(InternalsTest, SetCMErrorStoresFirstAndRaisesNothingForZero) {
 }
 
 TEST_F(InternalsTest, TemporaryNamesCountFromZeroAfterStartUp) {
-  ASSERT_GT(std::strlen(TempFolderPath), 0u);
-  const std::string folder = TempFolderPath;
+  ASSERT_GT(std::strlen(WorkingFolderPath), 0u);
+  const std::string folder = WorkingFolderPath;
   char name[MAX_PATH];
   ASSERT_TRUE(MakeTempName(name, sizeof name));
   EXPECT_EQ(std::string(name), folder + "0");

@@ -3,6 +3,7 @@
 #ifndef TINTWELL_TESTS_PROFILE_FILES_H
 #define TINTWELL_TESTS_PROFILE_FILES_H
 
+#include <dirent.h>
 #include <gtest/gtest.h>
 #include <stdlib.h>
 #include <unistd.h>
@@ -44,14 +45,37 @@ class ProfileFiles {
   static bool Exists(const std::string& path) { return access(path.c_str(), F_OK) == 0; }
 
   // The plugin's temporary folder: "temp" beside the running executable.
-  static std::string PluginTempFolder() {
-    char exe[PATH_MAX];
-    const ssize_t n = readlink("/proc/self/exe", exe, sizeof exe - 1);
-    std::string dir(exe, n > 0 ? static_cast<size_t>(n) : 0);
-    return dir.substr(0, dir.rfind('/')) + "/temp/";
+  static std::string PluginTempFolder() { return FolderOfExecutable() + "/temp/"; }
+
+  // The numbered folder of the temporary folder where the plugin loaded by this process
+  // keeps its working copies: the one whose lock this process holds open.
+  static std::string PluginWorkingFolder() {
+    const std::string temp = PluginTempFolder();
+    std::string found;
+    DIR* fds = opendir("/proc/self/fd");
+    if (!fds) return found;
+    while (const dirent* e = readdir(fds)) {
+      char target[PATH_MAX];
+      const ssize_t n = readlink(("/proc/self/fd/" + std::string(e->d_name)).c_str(), target, sizeof target - 1);
+      if (n <= 0) continue;
+      const std::string path(target, static_cast<size_t>(n));
+      const std::string suffix = "/lock";
+      if (path.compare(0, temp.size(), temp) == 0 && path.size() > suffix.size() &&
+          path.compare(path.size() - suffix.size(), suffix.size(), suffix) == 0)
+        found = path.substr(0, path.size() - suffix.size() + 1);
+    }
+    closedir(fds);
+    return found;
   }
 
  private:
+  static std::string FolderOfExecutable() {
+    char exe[PATH_MAX];
+    const ssize_t n = readlink("/proc/self/exe", exe, sizeof exe - 1);
+    std::string dir(exe, n > 0 ? static_cast<size_t>(n) : 0);
+    return dir.substr(0, dir.rfind('/'));
+  }
+
   std::string root_;
   std::string colorDir_;
 };

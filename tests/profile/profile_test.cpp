@@ -23,7 +23,8 @@ TEST_F(ProfileTest, EachObjectWorksOnItsOwnCopyAndTheLaterSaveWins) {
   Object a = Open(f);
   Object b = Open(f);
   ASSERT_EQ(Error(), 0);
-  const std::string temp = ProfileFiles::PluginTempFolder();
+  const std::string temp = ProfileFiles::PluginWorkingFolder();
+  ASSERT_FALSE(temp.empty());
   EXPECT_TRUE(ProfileFiles::Exists(temp + "0"));
   EXPECT_TRUE(ProfileFiles::Exists(temp + "1"));
   rt->Set(a, "Model", 111);
@@ -43,16 +44,16 @@ TEST_F(ProfileTest, DestroyingWithoutSavingKeepsTheFileAndDeletesTheCopy) {
     Object p = Open(f);
     rt->Set(p, "Manufacturer", "XXXX");
     rt->Set(p, "RenderIntent", 3);
-    EXPECT_TRUE(ProfileFiles::Exists(ProfileFiles::PluginTempFolder() + "0"));
+    EXPECT_TRUE(ProfileFiles::Exists(ProfileFiles::PluginWorkingFolder() + "0"));
   }
   EXPECT_EQ(ProfileFiles::Read(f), original);
-  EXPECT_FALSE(ProfileFiles::Exists(ProfileFiles::PluginTempFolder() + "0"));
+  EXPECT_FALSE(ProfileFiles::Exists(ProfileFiles::PluginWorkingFolder() + "0"));
 }
 
 TEST_F(ProfileTest, ASaveWhoseWriteFailsIsReportedAndLeavesTheFileAlone) {
   const std::string f = files.Copy("sRGB.icc", "a.icc");
   const auto original = ProfileFiles::Read(f);
-  const std::string temp = ProfileFiles::PluginTempFolder();
+  const std::string temp = ProfileFiles::PluginWorkingFolder();
   const std::string moved = temp.substr(0, temp.size() - 1) + ".moved";
   Object p = Open(f);
   rt->Set(p, "Model", 42);
@@ -129,13 +130,14 @@ TEST_F(ProfileTest, IntentAndCmmFromTheConstructorSurviveASave) {
     EXPECT_EQ(rt->Get(p, "CMM").AsString(), "abcd");
     rt->Call(p, "SaveProfile");
     EXPECT_EQ(Error(), 0);
+    EXPECT_TRUE(ProfileFiles::Exists(files.colorDir() + "/0"));  // installed under its own name
   }
   ASSERT_GE(log.entries.size(), 5u);
   EXPECT_EQ(log.entries[0], "DebugString:TEMP PATH:");
   EXPECT_EQ(log.entries[2], "DebugString:TEMP NAME:");
   EXPECT_EQ(log.entries[3], "DebugString:0");
   EXPECT_EQ(log.entries[4], "DebugString:InstallColorProfile");
-  EXPECT_TRUE(ProfileFiles::Exists(files.colorDir() + "/0"));  // installed under its own name
+  EXPECT_FALSE(ProfileFiles::Exists(files.colorDir() + "/0"));  // the installed copy goes with its object
   Object reopened = Open(f);
   EXPECT_EQ(rt->Get(reopened, "RenderIntent").AsInteger(), 2);
   EXPECT_EQ(rt->Get(reopened, "CMM").AsString(), "abcd");

@@ -201,6 +201,7 @@ BOOL WINAPI SetColorProfileElement(HPROFILE hProfile, TAGTYPE tag, DWORD dwOffse
                                    PVOID pElement);
 BOOL WINAPI GetColorDirectoryA(PCSTR pMachineName, PSTR pBuffer, PDWORD pdwSize);
 BOOL WINAPI InstallColorProfileA(PCSTR pMachineName, PCSTR pProfileName);
+BOOL WINAPI UninstallColorProfileA(PCSTR pMachineName, PCSTR pProfileName, BOOL bDelete);
 
 HTRANSFORM WINAPI CreateMultiProfileTransform(PHPROFILE pahProfiles, DWORD nProfiles, PDWORD padwIntent,
                                               DWORD nIntents, DWORD dwFlags, DWORD indexPreferredCMM);

@@ -16,6 +16,10 @@ std::optional<std::string> PosixPathFromWindows(const std::string& windowsPath);
 // A relative path is made absolute against the working directory first.
 std::string WindowsPathFromPosix(const std::string& posixPath);
 
+// As WindowsPathFromPosix, or nothing for a path that drive Z: cannot spell: a backslash
+// in a POSIX name would map back to a folder separator, naming another file.
+std::optional<std::string> ExactWindowsPathFromPosix(const std::string& posixPath);
+
 }  // namespace win32
 
 #endif

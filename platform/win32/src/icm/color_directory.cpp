@@ -84,7 +84,8 @@ DWORD ResolveProfilePath(const std::string& name, std::string& posixPath) {
 }
 
 DWORD ReadFileBytes(const std::string& posixPath, std::vector<std::uint8_t>& bytes) {
-  const int fd = open(posixPath.c_str(), O_RDONLY | O_CLOEXEC);
+  // Not blocking, so that a named pipe is refused rather than waited on.
+  const int fd = open(posixPath.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK);
   if (fd < 0) {
     const int err = errno;
     if (err != ENOENT) return ErrorFromErrno(err);
@@ -99,8 +100,8 @@ DWORD ReadFileBytes(const std::string& posixPath, std::vector<std::uint8_t>& byt
   struct stat st;
   if (fstat(fd, &st) != 0) {
     result = ErrorFromErrno(errno);
-  } else if (S_ISDIR(st.st_mode)) {
-    result = ERROR_ACCESS_DENIED;
+  } else if (!S_ISREG(st.st_mode)) {
+    result = ERROR_ACCESS_DENIED;  // a folder, device or pipe is no profile
   } else if (static_cast<std::uint64_t>(st.st_size) > kMaxProfileSize) {
     result = ERROR_INVALID_PROFILE;
   } else {
@@ -139,7 +140,9 @@ extern "C" BOOL WINAPI GetColorDirectoryA(PCSTR pMachineName, PSTR pBuffer, PDWO
     const std::string directory = win32::icm::ColorDirectory();
     const DWORD made = win32::icm::EnsureDirectory(directory);
     if (made != ERROR_SUCCESS) return Fail(made);
-    const std::string windows = win32::WindowsPathFromPosix(directory);
+    const auto mapped = win32::ExactWindowsPathFromPosix(directory);
+    if (!mapped) return Fail(ERROR_INVALID_NAME);
+    const std::string& windows = *mapped;
     const DWORD needed = static_cast<DWORD>(windows.size() + 1);
     const bool fits = pBuffer != nullptr && *pdwSize >= needed;
     *pdwSize = needed;
@@ -175,6 +178,29 @@ extern "C" BOOL WINAPI InstallColorProfileA(PCSTR pMachineName, PCSTR pProfileNa
       code = win32::WriteFileAtomically(target, bytes.data(), bytes.size());
       if (code != ERROR_SUCCESS) return Fail(code);
     }
+    SetLastError(ERROR_SUCCESS);
+    return TRUE;
+  } catch (...) {  // only allocation throws here
+    return Fail(ERROR_NOT_ENOUGH_MEMORY);
+  }
+}
+
+// Removes a profile of that file name from the colour directory; a path names the file
+// by its last component, as installing it did. Without bDelete there is nothing to
+// undo here: installing is only the copy.
+extern "C" BOOL WINAPI UninstallColorProfileA(PCSTR pMachineName, PCSTR pProfileName, BOOL bDelete) {
+  try {
+    if (pMachineName != nullptr || pProfileName == nullptr || pProfileName[0] == '\0')
+      return Fail(ERROR_INVALID_PARAMETER);
+    const std::string name = pProfileName;
+    const std::size_t cut = name.find_last_of("\\/");
+    const std::string file = cut == std::string::npos ? name : name.substr(cut + 1);
+    if (file.empty() || file == "." || file == "..") return Fail(ERROR_INVALID_PARAMETER);
+    const std::string target = win32::icm::ColorDirectory() + "/" + file;
+    struct stat st;
+    if (lstat(target.c_str(), &st) != 0) return Fail(ERROR_FILE_NOT_FOUND);
+    if (!S_ISREG(st.st_mode)) return Fail(ERROR_ACCESS_DENIED);
+    if (bDelete && unlink(target.c_str()) != 0) return Fail(win32::ErrorFromErrno(errno));
     SetLastError(ERROR_SUCCESS);
     return TRUE;
   } catch (...) {  // only allocation throws here

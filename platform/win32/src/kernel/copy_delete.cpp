@@ -1,20 +1,24 @@
-// CopyFileA and DeleteFileA.
+// CopyFileA, DeleteFileA, RemoveDirectoryA and SetFileAttributesA.
 #include <fcntl.h>
 #include <stdio.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 #include <cerrno>
+#include <cstdint>
 #include <new>
 #include <string>
 #include <vector>
 
+#include "icm/icc_container.h"
+#include "kernel/atomic_file.h"
 #include "kernel/errno_map.h"
 #include "kernel/file_paths.h"
 #include "windows.h"
 
 namespace {
 
+// Closes a descriptor when it goes.
 class Fd {
  public:
   explicit Fd(int fd) : fd_(fd) {}
@@ -24,35 +28,16 @@ class Fd {
     if (fd_ >= 0) close(fd_);
   }
   int get() const { return fd_; }
-  // Closes now, so a failed close can be reported; returns 0 or an errno value.
-  int Close() {
-    const int result = close(fd_);
-    fd_ = -1;
-    return result == 0 ? 0 : errno;
-  }
 
  private:
   int fd_;
 };
 
-// Writes all of data, retrying short and interrupted writes; returns 0 or an errno value.
-int WriteAll(int fd, const char* data, std::size_t size) {
-  while (size > 0) {
-    const ssize_t n = write(fd, data, size);
-    if (n < 0) {
-      if (errno == EINTR) continue;
-      return errno;
-    }
-    data += n;
-    size -= static_cast<std::size_t>(n);
-  }
-  return 0;
-}
-
-// Streams in into out, then gives out the source's permissions and times; returns 0 or
-// an errno value.
+// Streams in into out, no more than the largest profile the layer reads, then gives out
+// the source's last write time, as Windows keeps it; returns 0 or an errno value.
 int CopyContent(int in, int out, const struct stat& source) {
   std::vector<char> buffer(1 << 16);
+  std::uint64_t copied = 0;
   for (;;) {
     const ssize_t n = read(in, buffer.data(), buffer.size());
     if (n < 0) {
@@ -60,26 +45,12 @@ int CopyContent(int in, int out, const struct stat& source) {
       return errno;
     }
     if (n == 0) break;
-    if (const int err = WriteAll(out, buffer.data(), static_cast<std::size_t>(n))) return err;
+    copied += static_cast<std::uint64_t>(n);
+    if (copied > win32::icm::kMaxProfileSize) return EFBIG;
+    if (const int err = win32::WriteAll(out, buffer.data(), static_cast<std::size_t>(n))) return err;
   }
-  if (fsync(out) != 0) return errno;
-  // The permission bits carry the read-only attribute; the last write time is kept, as
-  // Windows keeps it.
-  if (fchmod(out, source.st_mode & 0777) != 0) return errno;
   const struct timespec times[2] = {source.st_atim, source.st_mtim};
-  if (futimens(out, times) != 0) return errno;
-  return 0;
-}
-
-// Moves temp onto target; with noReplace an existing target is kept and EEXIST returned.
-int MoveIntoPlace(const std::string& temp, const std::string& target, bool noReplace) {
-  if (!noReplace) return rename(temp.c_str(), target.c_str()) == 0 ? 0 : errno;
-  if (renameat2(AT_FDCWD, temp.c_str(), AT_FDCWD, target.c_str(), RENAME_NOREPLACE) == 0) return 0;
-  if (errno != EINVAL && errno != ENOSYS) return errno;
-  // File systems without the flag: check, then rename.
-  struct stat st;
-  if (lstat(target.c_str(), &st) == 0) return EEXIST;
-  return rename(temp.c_str(), target.c_str()) == 0 ? 0 : errno;
+  return futimens(out, times) == 0 ? 0 : errno;
 }
 
 DWORD CopyFileImpl(LPCSTR existing, LPCSTR target, bool failIfExists) {
@@ -87,38 +58,35 @@ DWORD CopyFileImpl(LPCSTR existing, LPCSTR target, bool failIfExists) {
   if (const DWORD err = win32::PosixFileFromWindows(existing, &from)) return err;
   if (const DWORD err = win32::PosixFileFromWindows(target, &to)) return err;
 
-  Fd in(open(from.c_str(), O_RDONLY | O_CLOEXEC));
+  // Not blocking, so that a named pipe is refused rather than waited on.
+  Fd in(open(from.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
   if (in.get() < 0) return win32::FileErrorFromErrno(errno, from);
   struct stat source;
   if (fstat(in.get(), &source) != 0) return win32::ErrorFromErrno(errno);
-  if (S_ISDIR(source.st_mode)) return ERROR_ACCESS_DENIED;
+  // Only files are copied: a folder, device or pipe has no end to copy to.
+  if (!S_ISREG(source.st_mode)) return ERROR_ACCESS_DENIED;
+  if (static_cast<std::uint64_t>(source.st_size) > win32::icm::kMaxProfileSize) return ERROR_FILE_TOO_LARGE;
 
+  std::string resolved;
+  if (const DWORD err = win32::ResolveWriteTarget(to, &resolved)) return err;
   struct stat dest;
-  if (stat(to.c_str(), &dest) == 0) {
+  if (stat(resolved.c_str(), &dest) == 0) {
     if (failIfExists) return ERROR_FILE_EXISTS;
-    const bool same = dest.st_dev == source.st_dev && dest.st_ino == source.st_ino;
-    if (same) return ERROR_SHARING_VIOLATION;
-    if (S_ISDIR(dest.st_mode) || win32::IsReadOnlyMode(dest.st_mode)) return ERROR_ACCESS_DENIED;
+    if (dest.st_dev == source.st_dev && dest.st_ino == source.st_ino) return ERROR_SHARING_VIOLATION;
+    if (!S_ISREG(dest.st_mode) || win32::IsReadOnlyMode(dest.st_mode)) return ERROR_ACCESS_DENIED;
   } else if (errno != ENOENT) {
-    return win32::FileErrorFromErrno(errno, to);
-  } else if (win32::MissingFileError(to) == ERROR_PATH_NOT_FOUND) {
+    return win32::FileErrorFromErrno(errno, resolved);
+  } else if (win32::MissingFileError(resolved) == ERROR_PATH_NOT_FOUND) {
     return ERROR_PATH_NOT_FOUND;
   }
 
-  // The copy is made under a hidden temporary name in the destination's folder and
-  // renamed over the destination only when whole, so a crash leaves either file intact.
-  const std::size_t slash = to.rfind('/');
-  std::string temp = to.substr(0, slash + 1) + ".tw-copy-XXXXXX";
-  Fd out(mkostemp(temp.data(), O_CLOEXEC));
-  if (out.get() < 0) return win32::FileErrorFromErrno(errno, to);
-  int err = CopyContent(in.get(), out.get(), source);
-  if (const int closeErr = out.Close(); err == 0) err = closeErr;
-  if (err == 0) err = MoveIntoPlace(temp, to, failIfExists);
-  if (err != 0) {
-    unlink(temp.c_str());
-    return err == EEXIST ? ERROR_FILE_EXISTS : win32::ErrorFromErrno(err);
-  }
-  return ERROR_SUCCESS;
+  // The copy takes the source's permissions, which carry the read-only attribute, as
+  // Windows copies attributes.
+  win32::ReplaceOptions options;
+  options.mode = source.st_mode & 0777;
+  options.keepTargetMode = false;
+  options.keepExisting = failIfExists;
+  return win32::ReplaceFileWith(resolved, [&](int out) { return CopyContent(in.get(), out, source); }, options);
 }
 
 DWORD DeleteFileImpl(LPCSTR name) {
@@ -130,6 +98,29 @@ DWORD DeleteFileImpl(LPCSTR name) {
   // Windows refuses to delete a read-only file; a link has no such attribute of its own.
   if (!S_ISLNK(st.st_mode) && win32::IsReadOnlyMode(st.st_mode)) return ERROR_ACCESS_DENIED;
   if (unlink(path.c_str()) != 0) return win32::FileErrorFromErrno(errno, path);
+  return ERROR_SUCCESS;
+}
+
+DWORD RemoveDirectoryImpl(LPCSTR name) {
+  std::string path;
+  if (const DWORD err = win32::PosixFileFromWindows(name, &path)) return err;
+  struct stat st;
+  if (lstat(path.c_str(), &st) != 0) return win32::FileErrorFromErrno(errno, path);
+  if (!S_ISDIR(st.st_mode)) return ERROR_DIRECTORY;
+  if (rmdir(path.c_str()) != 0) return errno == ENOTEMPTY || errno == EEXIST ? ERROR_DIR_NOT_EMPTY
+                                                                              : win32::FileErrorFromErrno(errno, path);
+  return ERROR_SUCCESS;
+}
+
+// Only the read-only attribute has a POSIX meaning: it clears every write bit, and its
+// absence gives the owner write access back.
+DWORD SetFileAttributesImpl(LPCSTR name, DWORD attributes) {
+  std::string path;
+  if (const DWORD err = win32::PosixFileFromWindows(name, &path)) return err;
+  struct stat st;
+  if (stat(path.c_str(), &st) != 0) return win32::FileErrorFromErrno(errno, path);
+  const mode_t mode = (attributes & FILE_ATTRIBUTE_READONLY) ? (st.st_mode & 07555) : (st.st_mode | S_IWUSR);
+  if (chmod(path.c_str(), mode & 07777) != 0) return win32::FileErrorFromErrno(errno, path);
   return ERROR_SUCCESS;
 }
 
@@ -152,6 +143,22 @@ extern "C" BOOL WINAPI CopyFileA(LPCSTR lpExistingFileName, LPCSTR lpNewFileName
 extern "C" BOOL WINAPI DeleteFileA(LPCSTR lpFileName) {
   try {
     return Finish(DeleteFileImpl(lpFileName));
+  } catch (const std::bad_alloc&) {
+    return Finish(ERROR_NOT_ENOUGH_MEMORY);
+  }
+}
+
+extern "C" BOOL WINAPI RemoveDirectoryA(LPCSTR lpPathName) {
+  try {
+    return Finish(RemoveDirectoryImpl(lpPathName));
+  } catch (const std::bad_alloc&) {
+    return Finish(ERROR_NOT_ENOUGH_MEMORY);
+  }
+}
+
+extern "C" BOOL WINAPI SetFileAttributesA(LPCSTR lpFileName, DWORD dwFileAttributes) {
+  try {
+    return Finish(SetFileAttributesImpl(lpFileName, dwFileAttributes));
   } catch (const std::bad_alloc&) {
     return Finish(ERROR_NOT_ENOUGH_MEMORY);
   }

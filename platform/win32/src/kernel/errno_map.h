@@ -25,6 +25,8 @@ inline DWORD ErrorFromErrno(int err) {
     case EBUSY:
     case ETXTBSY: return ERROR_SHARING_VIOLATION;
     case EINVAL: return ERROR_INVALID_PARAMETER;
+    case EFBIG: return ERROR_FILE_TOO_LARGE;
+    case ELOOP: return ERROR_CANT_RESOLVE_FILENAME;
     default: return ERROR_WRITE_FAULT;
   }
 }

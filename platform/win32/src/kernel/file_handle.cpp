@@ -1,6 +1,7 @@
 // CreateFileA, WriteFile and CloseHandle for files written in binary, as the plugin
 // writes a profile it has built.
 #include <fcntl.h>
+#include <sys/file.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -49,7 +50,8 @@ int OpenAs(const std::string& path, DWORD disposition, int accessFlags, mode_t m
         *err = ERROR_ACCESS_DENIED;
         return -1;
       }
-      const int fd = open(path.c_str(), accessFlags | O_CLOEXEC | (truncates ? O_TRUNC : 0));
+      // Not blocking, so that opening a named pipe does not wait for its other end.
+      const int fd = open(path.c_str(), accessFlags | O_CLOEXEC | O_NONBLOCK | (truncates ? O_TRUNC : 0));
       if (fd >= 0 || errno != ENOENT) {
         if (fd < 0) *err = win32::FileErrorFromErrno(errno, path);
         return fd;
@@ -73,7 +75,17 @@ int OpenAs(const std::string& path, DWORD disposition, int accessFlags, mode_t m
   }
 }
 
-HANDLE CreateFileImpl(LPCSTR name, DWORD access, DWORD disposition, DWORD attributes) {
+// Share modes between handles of this call: a handle that shares nothing holds an
+// exclusive lock, any other a shared one, so an open that would conflict fails with
+// ERROR_SHARING_VIOLATION, across processes too. The lock goes with the last handle, or
+// with the process. Other file calls take no part.
+DWORD LockAsShared(int fd, DWORD shareMode) {
+  const int lock = shareMode == 0 ? LOCK_EX : LOCK_SH;
+  if (flock(fd, lock | LOCK_NB) == 0) return ERROR_SUCCESS;
+  return errno == EWOULDBLOCK ? ERROR_SHARING_VIOLATION : win32::ErrorFromErrno(errno);
+}
+
+HANDLE CreateFileImpl(LPCSTR name, DWORD access, DWORD shareMode, DWORD disposition, DWORD attributes) {
   std::string path;
   DWORD err = win32::PosixFileFromWindows(name, &path);
   if (err == ERROR_SUCCESS && ((access & ~kKnownAccess) != 0 || disposition < CREATE_NEW ||
@@ -92,7 +104,12 @@ HANDLE CreateFileImpl(LPCSTR name, DWORD access, DWORD disposition, DWORD attrib
   auto file = std::make_shared<OpenFile>(canWrite);
   bool existed = false;
   file->fd = OpenAs(path, disposition, accessFlags, mode, &existed, &err);
-  if (file->fd < 0) {
+  if (file->fd >= 0) {
+    err = LockAsShared(file->fd, shareMode);
+    const int flags = fcntl(file->fd, F_GETFL);
+    if (flags >= 0) fcntl(file->fd, F_SETFL, flags & ~O_NONBLOCK);
+  }
+  if (file->fd < 0 || err != ERROR_SUCCESS) {
     SetLastError(err);
     return INVALID_HANDLE_VALUE;
   }
@@ -106,12 +123,12 @@ HANDLE CreateFileImpl(LPCSTR name, DWORD access, DWORD disposition, DWORD attrib
 }  // namespace
 
 extern "C" HANDLE WINAPI CreateFileA(LPCSTR lpFileName, DWORD dwDesiredAccess,
-                                     DWORD /*dwShareMode*/,
+                                     DWORD dwShareMode,
                                      LPSECURITY_ATTRIBUTES /*lpSecurityAttributes*/,
                                      DWORD dwCreationDisposition, DWORD dwFlagsAndAttributes,
                                      HANDLE /*hTemplateFile*/) {
   try {
-    return CreateFileImpl(lpFileName, dwDesiredAccess, dwCreationDisposition, dwFlagsAndAttributes);
+    return CreateFileImpl(lpFileName, dwDesiredAccess, dwShareMode, dwCreationDisposition, dwFlagsAndAttributes);
   } catch (const std::bad_alloc&) {
     SetLastError(ERROR_NOT_ENOUGH_MEMORY);
     return INVALID_HANDLE_VALUE;

@@ -23,7 +23,12 @@ extern "C" DWORD WINAPI GetModuleFileNameA(HMODULE hModule, LPSTR lpFilename, DW
     return 0;
   }
   exe[n] = '\0';
-  const std::string path = win32::WindowsPathFromPosix(exe);
+  const auto mapped = win32::ExactWindowsPathFromPosix(exe);
+  if (!mapped) {
+    SetLastError(ERROR_INVALID_NAME);  // drive Z: cannot name it
+    return 0;
+  }
+  const std::string& path = *mapped;
   if (nSize == 0 || lpFilename == nullptr) {
     SetLastError(ERROR_INSUFFICIENT_BUFFER);
     return 0;

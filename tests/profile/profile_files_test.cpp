@@ -1,0 +1,129 @@
+// Profiles on files that are not plain, writable, single-named files, and the plugin's
+// temporary folder across programs: nothing is lost, nothing hangs, nothing is left.
+#include <fcntl.h>
+#include <sys/file.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cstdio>
+#include <cstdlib>
+
+#include "plugin_fixture.h"
+#include "profile_files.h"
+
+namespace {
+
+using host::Object;
+
+class ProfileFileTest : public PluginTest {
+ protected:
+  Object Open(const std::string& path) { return rt->New("Profile", {rt->MakeFolderItem(path)}); }
+  int32_t ModelOf(const std::string& path) { return rt->Get(Open(path), "Model").AsInteger(); }
+  // The files in this program's working folder, its lock aside.
+  int WorkingCopies() {
+    int n = 0;
+    const std::string folder = ProfileFiles::PluginWorkingFolder();
+    DIR* dir = opendir(folder.c_str());
+    while (const dirent* e = dir ? readdir(dir) : nullptr)
+      if (e->d_name[0] != '.' && std::string(e->d_name) != "lock") ++n;
+    if (dir) closedir(dir);
+    return n;
+  }
+  ProfileFiles files;
+};
+
+TEST_F(ProfileFileTest, AReadOnlyProfileOpensAndRefusesASaveWithoutLosingTheEdit) {
+  const std::string f = files.Copy("sRGB.icc", "ro.icc");
+  ASSERT_EQ(chmod(f.c_str(), 0444), 0);
+  const auto original = ProfileFiles::Read(f);
+  for (int run = 0; run < 2; ++run) {  // a read-only copy once poisoned every later open
+    SCOPED_TRACE(run);
+    Object p = Open(f);
+    ASSERT_EQ(Error(), 0);
+    rt->Set(p, "Model", 4242);
+    rt->Call(p, "SaveProfile");
+    EXPECT_EQ(Error(), 5);  // ERROR_ACCESS_DENIED
+    EXPECT_EQ(rt->Get(p, "Model").AsInteger(), 4242);
+    rt->Call(p, "SaveProfileAs", {rt->MakeFolderItem(files.Path("elsewhere.icc"))});
+    EXPECT_EQ(Error(), 0);
+  }
+  EXPECT_EQ(ProfileFiles::Read(f), original);
+  struct stat st;
+  ASSERT_EQ(stat(f.c_str(), &st), 0);
+  EXPECT_EQ(st.st_mode & 0777, 0444u);
+  EXPECT_EQ(ModelOf(files.Path("elsewhere.icc")), 4242);
+}
+
+TEST_F(ProfileFileTest, FilesThatAreNotFilesAreRefusedBeforeCopying) {
+  const std::string fifo = files.Path("pipe.icc");
+  ASSERT_EQ(mkfifo(fifo.c_str(), 0666), 0);
+  const std::string folder = files.Path("folder.icc");
+  ASSERT_EQ(mkdir(folder.c_str(), 0777), 0);
+  for (const std::string& path : {std::string("/dev/zero"), fifo, folder}) {
+    SCOPED_TRACE(path);
+    Object p = Open(path);
+    EXPECT_EQ(Error(), 5);  // ERROR_ACCESS_DENIED, at once
+    EXPECT_FALSE(rt->Call(p, "ValidProfile").AsBoolean());
+  }
+  EXPECT_EQ(WorkingCopies(), 0);
+}
+
+TEST_F(ProfileFileTest, ASaveThroughASymbolicLinkUpdatesItsTarget) {
+  const std::string real = files.Copy("sRGB.icc", "real.icc");
+  const std::string link = files.Path("link.icc");
+  ASSERT_EQ(symlink("real.icc", link.c_str()), 0);
+  {
+    Object p = Open(link);
+    rt->Set(p, "Model", 77);
+    rt->Call(p, "SaveProfile");
+    EXPECT_EQ(Error(), 0);
+  }
+  struct stat st;
+  ASSERT_EQ(lstat(link.c_str(), &st), 0);
+  EXPECT_TRUE(S_ISLNK(st.st_mode));
+  EXPECT_EQ(ModelOf(real), 77);
+}
+
+TEST_F(ProfileFileTest, ANameWithABackslashIsRefusedRatherThanMisread) {
+  files.Copy("sRGB.icc", "a");
+  EXPECT_THROW(rt->MakeFolderItem(files.Path("a\\b.icc")), host::HostError);
+}
+
+// Folders of programs that have ended are removed at start-up; a live program's stay.
+TEST_F(ProfileFileTest, StartUpSweepsTheFoldersOfEndedProgramsOnly) {
+  const std::string temp = ProfileFiles::PluginTempFolder();
+  const std::string ended = temp + "900001/", live = temp + "900002/";
+  for (const std::string& folder : {ended, live}) {
+    ASSERT_EQ(mkdir(folder.c_str(), 0777), 0);
+    ProfileFiles::Write(folder + "lock", {});
+    ProfileFiles::Write(folder + "0", {'x'});
+    chmod((folder + "0").c_str(), 0444);
+  }
+  const int held = open((live + "lock").c_str(), O_RDWR);
+  ASSERT_EQ(flock(held, LOCK_EX), 0);
+  rt->CallGlobal("halvoUnregisterDebugger");
+  rt.reset();
+  rt = std::make_unique<host::Runtime>(TINTWELL_PLUGIN_PATH);
+  EXPECT_FALSE(ProfileFiles::Exists(ended));
+  EXPECT_TRUE(ProfileFiles::Exists(live + "0"));
+  close(held);
+  std::system(("rm -rf '" + live + "'").c_str());
+}
+
+TEST_F(ProfileFileTest, TheIntentConstructorsInstalledCopyGoesWithItsObject) {
+  const std::string f = files.Copy("sRGB.icc", "a.icc");
+  for (int i = 0; i < 3; ++i) {
+    Object p = rt->New("Profile", {rt->MakeFolderItem(f), 1, 0, "lcms"});
+    EXPECT_EQ(Error(), 0);
+    // Run again on the same object: the first copy and installation go.
+    rt->Call(p, "Profile", {rt->MakeFolderItem(f), 2, 0, "lcms"});
+  }
+  DIR* dir = opendir(files.colorDir().c_str());
+  int installed = 0;
+  while (const dirent* e = dir ? readdir(dir) : nullptr) installed += e->d_name[0] != '.';
+  if (dir) closedir(dir);
+  EXPECT_EQ(installed, 0);
+  EXPECT_EQ(WorkingCopies(), 0);
+}
+
+}  // namespace
