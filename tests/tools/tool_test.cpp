@@ -1,6 +1,7 @@
 // The command-line tool as a user runs it: output, exit status and messages.
 #include <gtest/gtest.h>
 #include <sys/wait.h>
+#include <unistd.h>
 
 #include <cstdio>
 #include <cstdlib>
@@ -23,7 +24,9 @@ std::string Slurp(const std::string& path) {
 // Runs the tool with args (shell words) and the given standard input.
 Result RunTool(const std::string& args, const std::string& input = "") {
   const std::string dir = ::testing::TempDir();
-  const std::string in = dir + "tw_in", out = dir + "tw_out", err = dir + "tw_err";
+  // Named after the process: tool tests run side by side.
+  const std::string stem = dir + "tw_" + std::to_string(getpid());
+  const std::string in = stem + "_in", out = stem + "_out", err = stem + "_err";
   std::ofstream(in) << input;
   const int raw = std::system((std::string("'") + TINTWELL_TOOL + "' " + args + " <" + in + " >" + out + " 2>" + err).c_str());
   return {WIFEXITED(raw) ? WEXITSTATUS(raw) : -1, Slurp(out), Slurp(err)};
