@@ -154,14 +154,27 @@ void MatchCMcolor(REALobject self, REALobject color) {
   SetCMError(LastCMError);
 }
 
+// False for "out of gamut" and for a check that could not be made; CMError tells the
+// two apart, so a script never takes a missing transform for an answer.
 bool CheckLAB(REALobject self, double l, double a, double b) {
   LastCMError = 0;
+  const HTRANSFORM transform = Data(self)->transform;
+  if (!transform) {
+    SendDebugString("Error: Colorworld has no transform");
+    SetCMError(kErrorSecondProfile);
+    return false;
+  }
   COLOR color;
   color.Lab.L = StoreRuleWord(l * 652.8);
   color.Lab.a = StoreRuleWord((a + 128.0) * 256.0);
   color.Lab.b = StoreRuleWord((b + 128.0) * 256.0);
   BYTE result = 1;
-  if (!CheckColors(Data(self)->transform, &color, 1, COLOR_Lab, &result)) return false;
+  if (!CheckColors(transform, &color, 1, COLOR_Lab, &result)) {
+    const DWORD code = GetLastError();
+    SendDebugString("CheckColors FAIL");
+    SetCMError(static_cast<int32_t>(code));
+    return false;
+  }
   return result == 0;
 }
 

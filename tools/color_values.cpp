@@ -1,32 +1,11 @@
 #include "color_values.h"
 
 #include <cmath>
+#include <cstdint>
 
 #include "session.h"
 
 namespace tool {
-
-ColorAccess AccessForSpace(const std::string& space) {
-  using Kind = ColorAccess::Kind;
-  if (space == "GRAY") return {Kind::Properties, {"gray"}, "gray 0 (white) to 1 (black)"};
-  if (space == "XYZ ") return {Kind::Xyz, {"X", "Y", "Z"}, "X Y Z 0-1"};
-  if (space == "Yxy ") return {Kind::Properties, {"ycapy", "yx", "yy"}, "Y x y 0-1"};
-  if (space == "Lab ") return {Kind::Properties, {"ll", "la", "lb"}, "L 0-100, a b -128-128"};
-  if (space == "Luv ") return {Kind::Properties, {"luvl", "luvu", "luvv"}, "L 0-100, u v -128-128"};
-  if (space == "HSV ") return {Kind::Properties, {"hsvh", "hsvs", "hsvv"}, "H S V 0-1"};
-  if (space == "HLS " || space == "YCbr" || space == "CMY " || space == "3CLR")
-    return {Kind::Properties, {"hlsh", "hlsl", "hlss"}, "three channels 0-1"};
-  if (space == "CMYK" || space == "4CLR") return {Kind::Properties, {"cc", "cm", "cy", "ck"}, "C M Y K 0-1"};
-  for (int n = 5; n <= 8; ++n)
-    if (space == std::to_string(n) + "CLR") {
-      ColorAccess a{Kind::Channels, {}, std::to_string(n) + " channels 0-255"};
-      for (int i = 1; i <= n; ++i) a.names.push_back(std::to_string(i));
-      return a;
-    }
-  return {Kind::Properties, {"rr", "rg", "rb"}, "R G B 0-255"};
-}
-
-ColorAccess NamedColorAccess() { return {ColorAccess::Kind::Named, {"index"}, "named-colour index from 1"}; }
 
 namespace {
 const char* ChannelMethod(std::size_t channels, bool set) {
@@ -53,8 +32,8 @@ void WriteColor(host::Runtime& rt, const host::Object& color, const ColorAccess&
         rt.Call(color, ChannelMethod(values.size(), true),
                 {static_cast<int>(i + 1), static_cast<int>(std::lround(values[i]))});
       break;
-    case ColorAccess::Kind::Named:
-      rt.Set(color, "namedindex", static_cast<int>(std::lround(values[0])));
+    case ColorAccess::Kind::Named:  // an unsigned index in the Integer's 32 bits
+      rt.Set(color, "namedindex", static_cast<int>(static_cast<std::uint32_t>(values[0])));
       break;
   }
 }
@@ -76,7 +55,7 @@ std::vector<double> ReadColor(host::Runtime& rt, const host::Object& color, cons
         values.push_back(rt.Call(color, ChannelMethod(access.names.size(), false), {static_cast<int>(i + 1)}).AsInteger());
       break;
     case ColorAccess::Kind::Named:
-      values.push_back(rt.Get(color, "namedindex").AsInteger());
+      values.push_back(static_cast<std::uint32_t>(rt.Get(color, "namedindex").AsInteger()));
       break;
   }
   return values;

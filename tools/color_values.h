@@ -1,5 +1,4 @@
-// How a script reads and writes a CMColor in a profile's colour space: the accessors
-// whose setters record that space's colour type, and the ranges they speak.
+// Writing and reading a CMColor through the accessors of a profile's colour space.
 #ifndef TINTWELL_TOOLS_COLOR_VALUES_H
 #define TINTWELL_TOOLS_COLOR_VALUES_H
 
@@ -7,21 +6,11 @@
 #include <vector>
 
 #include "host/runtime.h"
+#include "input_parse.h"
 
 namespace tool {
 
-struct ColorAccess {
-  enum class Kind { Properties, Xyz, Channels, Named } kind = Kind::Properties;
-  std::vector<std::string> names;  // property names, or component labels
-  std::string range;               // for help and messages
-};
-
-// The accessors for an ICC data colour space signature as the ColorSpace property
-// reads it ("RGB ", "CMYK", "Lab ", ...).
-ColorAccess AccessForSpace(const std::string& space);
-// The accessor for the colour indexes a named-colour profile takes in.
-ColorAccess NamedColorAccess();
-
+// Writes values that ParseColor accepted for access.
 void WriteColor(host::Runtime& rt, const host::Object& color, const ColorAccess& access,
                 const std::vector<double>& values);
 std::vector<double> ReadColor(host::Runtime& rt, const host::Object& color, const ColorAccess& access);

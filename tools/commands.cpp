@@ -1,8 +1,5 @@
 #include "commands.h"
 
-#include <cerrno>
-#include <cstdlib>
-#include <sstream>
 
 #include "color_values.h"
 #include "output.h"
@@ -10,14 +7,6 @@
 namespace tool {
 
 namespace {
-
-double ParseNumber(const std::string& text) {
-  errno = 0;
-  char* end = nullptr;
-  const double v = std::strtod(text.c_str(), &end);
-  if (text.empty() || *end != '\0' || errno == ERANGE) throw UsageError("not a number: " + text);
-  return v;
-}
 
 std::string SpaceOf(Session& s, const host::Object& profile) { return s.rt().Get(profile, "ColorSpace").AsString(); }
 
@@ -162,22 +151,26 @@ int ConvertCommand(Session& session, const std::vector<std::string>& args, const
   }
   session.Check("cannot build a colour world from these profiles");
 
-  // Colours come from the arguments, or one a line from the input.
+  // Colours come from the arguments, or one a line from the input. All of them are
+  // read and checked before the first is converted, so a bad value or line prints
+  // nothing but the error.
   std::vector<std::vector<double>> colors;
-  const std::size_t n = in.names.size();
+  const std::size_t n = in.channels.size();
   if (args.size() > 2) {
     if ((args.size() - 2) % n != 0)
       throw UsageError("expected a multiple of " + std::to_string(n) + " values (" + in.range + ")");
-    for (std::size_t i = 2; i < args.size(); i += n) {
-      std::vector<double> c;
-      for (std::size_t k = 0; k < n; ++k) c.push_back(ParseNumber(args[i + k]));
-      colors.push_back(c);
-    }
+    for (std::size_t i = 2; i < args.size(); i += n)
+      colors.push_back(ParseColor({args.begin() + static_cast<std::ptrdiff_t>(i),
+                                   args.begin() + static_cast<std::ptrdiff_t>(i + n)},
+                                  in));
+  } else {
+    colors = ReadColors(input, in);
   }
 
   host::Object color = rt.New("CMColor");
-  bool first = true;
-  auto convert = [&](const std::vector<double>& values) {
+  if (options.json) std::printf("[");
+  for (std::size_t k = 0; k < colors.size(); ++k) {
+    const std::vector<double>& values = colors[k];
     rt.Call(color, "reset");
     WriteColor(rt, color, in, values);
     rt.Call(world, "MatchCMcolor", {color});
@@ -187,28 +180,9 @@ int ConvertCommand(Session& session, const std::vector<std::string>& args, const
     for (std::size_t i = 0; i < values.size(); ++i) inText += (i ? options.json ? ", " : " " : "") + Number(values[i]);
     for (std::size_t i = 0; i < result.size(); ++i) outText += (i ? options.json ? ", " : " " : "") + Number(result[i]);
     if (options.json)
-      std::printf("%s\n  {\"in\": [%s], \"out\": [%s]}", first ? "" : ",", inText.c_str(), outText.c_str());
+      std::printf("%s\n  {\"in\": [%s], \"out\": [%s]}", k ? "," : "", inText.c_str(), outText.c_str());
     else
       std::printf("%s\n", outText.c_str());
-    first = false;
-  };
-
-  if (options.json) std::printf("[");
-  if (!colors.empty()) {
-    for (const auto& c : colors) convert(c);
-  } else {
-    char line[4096];
-    while (std::fgets(line, sizeof line, input)) {
-      std::istringstream words(line);
-      std::vector<double> c;
-      std::string word;
-      while (words >> word) {
-        if (word.back() == ',') word.pop_back();
-        if (!word.empty()) c.push_back(ParseNumber(word));
-      }
-      if (c.empty()) continue;
-      convert(c);
-    }
   }
   if (options.json) std::printf("\n]\n");
   return 0;
@@ -216,17 +190,16 @@ int ConvertCommand(Session& session, const std::vector<std::string>& args, const
 
 int GamutCommand(Session& session, const std::vector<std::string>& args, const Options& options) {
   if (args.size() != 4) throw UsageError("gamut needs a profile and L a b");
+  // The check encodes Lab in 16-bit words as CMColor does, so the same ranges hold.
+  const std::vector<double> lab = ParseColor({args[1], args[2], args[3]}, AccessForSpace("Lab "));
+  const double l = lab[0], a = lab[1], b = lab[2];
   host::Runtime& rt = session.rt();
   host::Object profile = session.OpenProfile(args[0]);
-  host::Object lab = session.OpenProfile("lab");
-  host::Object world = rt.New("ColorWorld", {lab, profile});
+  host::Object labProfile = session.OpenProfile("lab");
+  host::Object world = rt.New("ColorWorld", {labProfile, profile});
   session.Check("cannot build a colour world for " + args[0]);
-  const double l = ParseNumber(args[1]), a = ParseNumber(args[2]), b = ParseNumber(args[3]);
-  // The check encodes Lab in 16-bit words, which wrap outside these ranges.
-  if (!(l >= 0 && l <= 65535 / 652.8) || !(a >= -128 && a <= 65535 / 256.0 - 128) ||
-      !(b >= -128 && b <= 65535 / 256.0 - 128))
-    throw UsageError("L must lie in 0-100.39, a and b in -128-127.99");
   const bool inside = rt.Call(world, "CheckLAB", {l, a, b}).AsBoolean();
+  session.Check("the gamut could not be checked");
   if (options.json)
     std::printf("{\"L\": %s, \"a\": %s, \"b\": %s, \"inGamut\": %s}\n", Number(l).c_str(), Number(a).c_str(),
                 Number(b).c_str(), inside ? "true" : "false");

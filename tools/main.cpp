@@ -36,7 +36,8 @@ void PrintUsage(std::FILE* to) {
       "\n"
       "Colour values, by the profile's colour space: RGB 0-255; CMYK, XYZ, Yxy, HSV,\n"
       "HLS 0-1; gray 0 (white) to 1 (black); Lab and Luv L 0-100 with a, b (u, v)\n"
-      "-128-128; 5-8 channels 0-255.\n"
+      "from -128 to under 128; 5-8 channels whole numbers 0-255; a named-colour\n"
+      "profile takes indexes from 1. Other values are refused.\n"
       "\n"
       "Options:\n"
       "  --intent N      rendering intent of source and destination (0 perceptual,\n"
@@ -60,6 +61,14 @@ std::string DefaultPluginPath() {
   std::string dir(exe, static_cast<std::size_t>(n));
   dir.erase(dir.rfind('/'));
   return dir + "/../lib/libtintwell.so";
+}
+
+// Negative values look like options: anything strtod reads whole ("-1", "-.5", "-inf")
+// is a value, and the command judges its range.
+bool IsNumber(const std::string& word) {
+  char* end = nullptr;
+  std::strtod(word.c_str(), &end);
+  return end == word.c_str() + word.size();
 }
 
 int Usage(const std::string& message) {
@@ -94,7 +103,7 @@ int main(int argc, char** argv) {
         if (*v == '\0' || *end != '\0' || intent < 0 || intent > 3) return Usage("--intent takes 0, 1, 2 or 3");
         options.intent = static_cast<int>(intent);
       }
-    } else if (arg.size() > 1 && arg[0] == '-' && !(arg[1] >= '0' && arg[1] <= '9') && arg[1] != '.') {
+    } else if (arg.size() > 1 && arg[0] == '-' && !IsNumber(arg)) {
       return Usage("unknown option " + arg);
     } else {
       words.push_back(arg);

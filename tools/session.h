@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "host/runtime.h"
+#include "input_parse.h"  // UsageError
 
 namespace tool {
 
@@ -19,12 +20,6 @@ class JobError : public std::runtime_error {
 
  private:
   int code_;
-};
-
-// A usage error: bad arguments.
-class UsageError : public std::runtime_error {
- public:
-  using std::runtime_error::runtime_error;
 };
 
 class Session {

@@ -91,7 +91,7 @@ TEST_F(ColorWorldTest, UnusableProfilesLeaveTheColourWorldEmpty) {
   rt->Call(w2, "MatchCMcolor", {nullptr});
   EXPECT_EQ(Error(), -1);
   EXPECT_FALSE(rt->Call(w2, "CheckLAB", {50.0, 0.0, 0.0}).AsBoolean());
-  EXPECT_EQ(Error(), 0);
+  EXPECT_EQ(Error(), -21);
 
   // Rebuilding a built colour world says so before it starts.
   Object built = rt->New("ColorWorld", {srgb, srgb});
@@ -142,6 +142,22 @@ TEST_F(ColorWorldTest, CheckLabTellsInFromOutOfGamut) {
   EXPECT_FALSE(rt->Call(w, "CheckLAB", {90.0, -80.0, 80.0}).AsBoolean());
   EXPECT_EQ(Error(), 0);
   EXPECT_EQ(rt->Get(w, "CMMcount").AsInteger(), 1);
+}
+
+// Without a transform there is no answer: false must come with an error and a trace,
+// and the next check that can be made clears it.
+TEST_F(ColorWorldTest, CheckLabWithoutATransformReportsIt) {
+  Object lab = Open("LCMSLABI.ICM");
+  Object srgb = Open("sRGB.icc");
+  Object d = Debugger();
+  Object empty = rt->New("ColorWorld");
+  EXPECT_FALSE(rt->Call(empty, "CheckLAB", {50.0, 0.0, 0.0}).AsBoolean());
+  EXPECT_EQ(Error(), -21);
+  EXPECT_EQ(log.entries,
+            (std::vector<std::string>{"DebugString:Error: Colorworld has no transform", "DebugError:-21,"}));
+  Object w = rt->New("ColorWorld", {lab, srgb});
+  EXPECT_TRUE(rt->Call(w, "CheckLAB", {50.0, 0.0, 0.0}).AsBoolean());
+  EXPECT_EQ(Error(), 0);
 }
 
 TEST_F(ColorWorldTest, LinkColorWorldNeedsADeviceLink) {

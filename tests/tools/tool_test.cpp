@@ -8,6 +8,7 @@
 #include <fstream>
 #include <iterator>
 #include <string>
+#include <vector>
 
 namespace {
 
@@ -71,6 +72,71 @@ TEST(Tool, ConvertsColoursFromArgumentsAndInput) {
   r = RunTool("--via lab --intent 1 convert srgb gray 255 255 255");
   ASSERT_EQ(r.status, 0) << r.err;
   EXPECT_EQ(r.out, "0\n");
+}
+
+// Values the plugin would store wrapped, or as another colour: refused before anything
+// is converted (exit 2, nothing on standard output), naming the value and its range.
+TEST(Tool, RefusesValuesOutsideTheirChannelsRange) {
+  const std::string x11 = "convert " TINTWELL_ICC_DIR "/colord/x11-colors.icc srgb ";
+  const struct {
+    std::string args, input;
+    std::vector<std::string> said;
+  } cases[] = {
+      {"convert srgb lab 255.5 0 0", "", {"R ", "0 to 255", "not 255.5"}},
+      {"convert srgb lab 0 256 0", "", {"G ", "not 256"}},
+      {"convert srgb lab 0 0 -1", "", {"B ", "not -1"}},
+      {"convert srgb lab nan 0 0", "", {"not nan"}},
+      {"convert srgb lab 0 inf 0", "", {"not inf"}},
+      {"convert srgb lab 0 0 1e999", "", {"not 1e999"}},
+      {"convert srgb lab 0x 0 0", "", {"not 0x"}},
+      {"convert lab srgb 101 0 0", "", {"L ", "0 to 100", "not 101"}},
+      {"convert lab srgb 50 128 0", "", {"a ", "-128 to under 128", "not 128"}},
+      {"convert lab srgb 50 0 -128.5", "", {"b ", "not -128.5"}},
+      {"convert cmyk srgb 0 0 0 1.5", "", {"K ", "0 to 1", "not 1.5"}},
+      {"convert gray srgb -0.1", "", {"gray ", "not -0.1"}},
+      {x11 + "4294967297", "", {"index ", "whole number from 1 to 4294967295", "not 4294967297"}},
+      {x11 + "0", "", {"not 0"}},
+      {x11 + "1.5", "", {"not 1.5"}},
+      {"gamut srgb 100.2 0 0", "", {"L ", "not 100.2"}},
+      {"gamut srgb 50 -inf 0", "", {"a ", "not -inf"}},
+      {"--json gamut srgb 50 0 128", "", {"b ", "not 128"}},
+      {"--json convert srgb lab 255.5 0 0", "", {"not 255.5"}},
+      // From the input: every line is checked before the first colour is printed.
+      {"--json convert srgb lab", "0 0 0\n\n1 2 nan\n", {"line 3: ", "B ", "not nan"}},
+      {"convert srgb lab", "0 0 0\n1 2\n", {"line 2: ", "expected 3 values", "got 2"}},
+      {"convert srgb lab", "0 0 0 0\n", {"line 1: ", "got 4"}},
+  };
+  for (const auto& c : cases) {
+    const Result r = RunTool(c.args, c.input);
+    EXPECT_EQ(r.status, 2) << c.args;
+    EXPECT_TRUE(r.out.empty()) << c.args << ": " << r.out;
+    for (const std::string& text : c.said) EXPECT_NE(r.err.find(text), std::string::npos) << c.args << ": " << r.err;
+  }
+  // A huge value is named, but not in full.
+  const Result r = RunTool("convert srgb lab " + std::string(5000, '9') + " 0 0");
+  EXPECT_EQ(r.status, 2);
+  EXPECT_LT(r.err.size(), 200u) << r.err;
+}
+
+TEST(Tool, TakesTheEndsOfEachRangeAndLinesOfAnyLength) {
+  for (const char* args : {"convert srgb lab 255 255 255 0 0 0", "convert lab srgb 100 -128 127.999 0 0 0",
+                           "convert cmyk srgb 1 1 1 1 0 0 0 0", "convert gray srgb 1 0", "gamut srgb 100 -128 127.999",
+                           "gamut srgb 0 0 0"}) {
+    const Result r = RunTool(args);
+    EXPECT_EQ(r.status, 0) << args << ": " << r.err;
+  }
+  // Below 128 every a lands on the top word; none may wrap round to -128.
+  Result r = RunTool("convert lab srgb 50 127.999 -128");
+  EXPECT_EQ(r.out, RunTool("convert lab srgb 50 127.99609375 -128").out);
+  EXPECT_NE(r.out, RunTool("convert lab srgb 50 -128 -128").out);
+  // The top named index passes the tool; the plugin then finds no such colour.
+  r = RunTool("convert " TINTWELL_ICC_DIR "/colord/x11-colors.icc srgb 4294967295");
+  EXPECT_EQ(r.status, 1) << r.err;
+  // A line far longer than any buffer is still one colour.
+  const std::string red = "255." + std::string(5000, '0') + std::string(5000, ' ') + "0, 0\n";
+  r = RunTool("convert srgb lab", "0 0 0\n" + red);
+  ASSERT_EQ(r.status, 0) << r.err;
+  EXPECT_EQ(r.out, RunTool("convert srgb lab 0 0 0 255 0 0").out);
 }
 
 TEST(Tool, InfoAndGamut) {
