@@ -1,51 +1,66 @@
 #!/usr/bin/env bash
-# Builds the libFuzzer targets with clang in build-fuzz/ and runs each one, seeded with
-# the real profiles on this machine and the saved regressions.
+# Builds the libFuzzer targets with clang in $FUZZ_BUILD (default build-fuzz/), runs
+# each target once over its saved regressions (fuzz/regressions/<target>/), then
+# fuzzes it, seeded with those regressions (and, for the container, the real profiles
+# on this machine).
 #   scripts/fuzz.sh            5 minutes per target
-#   scripts/fuzz.sh --smoke    about 30 seconds in all (CI)
+#   scripts/fuzz.sh --smoke    about a minute in all (CI)
 #   scripts/fuzz.sh --time N   N seconds per target
-# A crash is copied to fuzz/regressions/<target>-<hash> (replayed by the test suite)
-# and the script fails.
+# A crash is copied to fuzz/regressions/<target>/crash-<hash> (rename it to say what it
+# holds; every later run replays it) and the script fails.
 set -euo pipefail
 cd "$(dirname "$0")/.."
 
-targets=(icc_container_fuzz)
+targets=(icc_container_fuzz tool_input_fuzz transform_fuzz bitmap_fuzz device_link_fuzz)
+build=${FUZZ_BUILD:-build-fuzz}
 seconds=300
 case "${1:-}" in
-  --smoke) seconds=$((30 / ${#targets[@]})) ;;
+  --smoke) seconds=$((50 / ${#targets[@]})) ;;
   --time) seconds=${2:?--time needs a number of seconds} ;;
   "") ;;
   *) echo "usage: $0 [--smoke | --time SECONDS]" >&2; exit 2 ;;
 esac
 
-cmake -S . -B build-fuzz -DTINTWELL_FUZZ=ON -DCMAKE_CXX_COMPILER=clang++ -DCMAKE_C_COMPILER=clang \
+cmake -S . -B "$build" -DTINTWELL_FUZZ=ON -DCMAKE_CXX_COMPILER=clang++ -DCMAKE_C_COMPILER=clang \
   -DTINTWELL_TESTS=OFF -DTINTWELL_BENCH=OFF -DCMAKE_BUILD_TYPE=RelWithDebInfo >/dev/null
-cmake --build build-fuzz -j2 --target "${targets[@]}"
+cmake --build "$build" -j2 --target "${targets[@]}"
 
 work=$(mktemp -d)
 trap 'rm -rf "$work"' EXIT
-mkdir -p "$work/seeds"
+mkdir -p "$work/profiles"
 n=0
 while IFS= read -r -d '' f; do
-  cp "$f" "$work/seeds/seed-$n"
+  cp "$f" "$work/profiles/seed-$n"
   n=$((n + 1))
 done < <(find /usr/share/color/icc /usr/share/color/argyll/ref -type f \( -iname '*.icc' -o -iname '*.icm' \) -print0 2>/dev/null)
-cp fuzz/regressions/* "$work/seeds/" 2>/dev/null || true
+export ASAN_OPTIONS=detect_leaks=1 UBSAN_OPTIONS=halt_on_error=1:print_stacktrace=1
 
 status=0
 for t in "${targets[@]}"; do
   corpus="$work/corpus-$t"
   artifacts="$work/artifacts-$t"
+  saved="fuzz/regressions/$t"
   mkdir -p "$corpus" "$artifacts"
-  echo "== $t: $seconds s, $n seed profiles"
-  if ! ASAN_OPTIONS=detect_leaks=1 UBSAN_OPTIONS=halt_on_error=1:print_stacktrace=1 \
-      "build-fuzz/bin/$t" "$corpus" "$work/seeds" -max_total_time="$seconds" -max_len=65536 \
+  seeds=()
+  [ -d "$saved" ] && seeds+=("$saved")
+  [ "$t" = icc_container_fuzz ] && seeds+=("$work/profiles")
+  regressions=()
+  [ -d "$saved" ] && mapfile -t regressions < <(find "$saved" -type f | sort)
+  echo "== $t: ${#regressions[@]} regressions, then $seconds s"
+  # libFuzzer runs files named on its command line once each.
+  if [ ${#regressions[@]} -gt 0 ] && ! "$build/bin/$t" "${regressions[@]}" >"$work/replay-$t.log" 2>&1; then
+    tail -n 40 "$work/replay-$t.log"
+    echo "$t: a saved regression fails" >&2
+    status=1
+  fi
+  if ! "$build/bin/$t" "$corpus" "${seeds[@]}" -max_total_time="$seconds" -max_len=65536 \
       -timeout=10 -rss_limit_mb=2048 -print_final_stats=1 -artifact_prefix="$artifacts/"; then
     status=1
   fi
   for crash in "$artifacts"/*; do
     [ -e "$crash" ] || continue
-    name="fuzz/regressions/$t-$(sha1sum "$crash" | cut -c1-12)"
+    mkdir -p "$saved"
+    name="$saved/crash-$(sha1sum "$crash" | cut -c1-12)"
     cp "$crash" "$name"
     echo "saved $name"
     status=1

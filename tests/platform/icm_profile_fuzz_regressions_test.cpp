@@ -12,7 +12,8 @@ using namespace icctest;
 
 TEST(FuzzRegressions, ReplayWithoutFaults) {
   int replayed = 0;
-  for (const auto& entry : std::filesystem::directory_iterator(std::string(TINTWELL_SOURCE_DIR) + "/fuzz/regressions")) {
+  for (const auto& entry :
+       std::filesystem::directory_iterator(std::string(TINTWELL_SOURCE_DIR) + "/fuzz/regressions/icc_container_fuzz")) {
     SCOPED_TRACE(entry.path().filename().string());
     const Bytes input = ReadBytes(entry.path().string());
     EXPECT_EQ(LLVMFuzzerTestOneInput(input.data(), input.size()), 0);

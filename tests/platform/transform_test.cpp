@@ -90,6 +90,46 @@ TEST_F(TransformTest, CreateChecksThatTheChainLinks) {
   }
 }
 
+// Class, data space and connection space must be signatures the engine knows before
+// the chain uses them; values with the top bit set are outside its enumerations.
+TEST_F(TransformTest, CreateRefusesUnknownHeaderSignatures) {
+  const icctest::Bytes srgb = icctest::ReadBytes(IccPath("sRGB.icc"));
+  const struct {
+    size_t at;
+    std::uint32_t value;
+    DWORD error;
+  } cases[] = {
+      {12, 0x80000000u | icctest::Sig("mntr"), ERROR_INVALID_PROFILE},
+      {16, 0x80000000u | icctest::Sig("RGB "), ERROR_INVALID_PROFILE},
+      {20, 0x80000000u | icctest::Sig("XYZ "), ERROR_INVALID_PROFILE},
+      {16, 0xFFFFFFFFu, ERROR_INVALID_PROFILE},
+      {12, icctest::Sig("ABCD"), ERROR_INVALID_PROFILE},
+      {16, icctest::Sig("ABCD"), ERROR_INVALID_PROFILE},
+      {20, icctest::Sig("ABCD"), ERROR_INVALID_PROFILE},
+      {12, icctest::Sig("scnr"), ERROR_SUCCESS},  // known values pass
+      {16, icctest::Sig("RGB "), ERROR_SUCCESS},
+  };
+  for (const auto& c : cases) {
+    icctest::Bytes bytes = srgb;
+    icctest::PutBE32(bytes, c.at, c.value);
+    Profile odd(bytes);
+    ASSERT_NE(odd.get(), nullptr);
+    for (bool first : {true, false}) {
+      SCOPED_TRACE(testing::Message() << c.at << " " << std::hex << c.value << (first ? " first" : " second"));
+      const HPROFILE pair[2] = {first ? odd.get() : adobe_.get(), first ? adobe_.get() : odd.get()};
+      SetLastError(kSentinel);
+      Xform x({pair[0], pair[1]}, {kRel, kRel});
+      EXPECT_EQ(x.get() != nullptr, c.error == ERROR_SUCCESS);
+      EXPECT_EQ(GetLastError(), c.error);
+      BYTE* link = nullptr;
+      DWORD intents[2] = {kRel, kRel};
+      EXPECT_WIN32(CreateDeviceLinkProfile(const_cast<PHPROFILE>(pair), 2, intents, 2, 0, &link, 0),
+                   c.error == ERROR_SUCCESS, c.error);
+      GlobalFree(link);
+    }
+  }
+}
+
 // Every call taking a transform refuses null, deleted and profile handles.
 TEST_F(TransformTest, CallsRefuseHandlesThatAreNotLiveTransforms) {
   HTRANSFORM x;

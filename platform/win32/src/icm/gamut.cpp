@@ -39,10 +39,11 @@ GamutCheck::~GamutCheck() {
   if (to_lab_) cmsDeleteTransform(to_lab_);
 }
 
-DWORD GamutCheck::Create(cmsContext context, cmsHPROFILE profile, std::unique_ptr<GamutCheck>& check) {
+DWORD GamutCheck::Create(cmsContext context, cmsHPROFILE profile, const ChainStep& step,
+                         std::unique_ptr<GamutCheck>& check) {
   check.reset();
-  const cmsProfileClassSignature cls = cmsGetDeviceClass(profile);
-  const cmsColorSpaceSignature space = cmsGetColorSpace(profile);
+  const cmsProfileClassSignature cls = step.profile_class;
+  const cmsColorSpaceSignature space = step.to_pcs ? step.in : step.out;
   if (cls == cmsSigLinkClass) return ERROR_NOT_SUPPORTED;
   if (cls == cmsSigAbstractClass || cls == cmsSigNamedColorClass || space == cmsSigLabData ||
       space == cmsSigXYZData) {

@@ -23,16 +23,21 @@
 
 namespace win32::icm {
 
+struct ChainStep;
+
 class GamutCheck {
  public:
   static constexpr double kMatrixEpsilon = 2e-4;
   static constexpr double kRoundTripDeltaE = 0.25;
   static constexpr int kPolishSteps = 60;
 
-  // Makes the check for a profile of the given context. A profile without a device
-  // gamut (abstract, named, or with a Lab or XYZ data space) gives null: everything
-  // is inside. A device link has no gamut in the PCS: ERROR_NOT_SUPPORTED.
-  static DWORD Create(cmsContext context, cmsHPROFILE profile, std::unique_ptr<GamutCheck>& check);
+  // Makes the check for a profile of the given context, the last of a chain; its class
+  // and data space come from the chain's step, whose header values were checked. A
+  // profile without a device gamut (abstract, named, or with a Lab or XYZ data space)
+  // gives null: everything is inside. A device link has no gamut in the PCS:
+  // ERROR_NOT_SUPPORTED.
+  static DWORD Create(cmsContext context, cmsHPROFILE profile, const ChainStep& step,
+                      std::unique_ptr<GamutCheck>& check);
 
   ~GamutCheck();
   GamutCheck(const GamutCheck&) = delete;

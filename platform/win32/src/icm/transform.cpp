@@ -7,6 +7,7 @@
 #include "icm/transform.h"
 
 #include <algorithm>
+#include <iterator>
 #include <new>
 
 #include "handle_table.h"
@@ -28,6 +29,33 @@ bool SpacesChain(cmsColorSpaceSignature from, cmsColorSpaceSignature to) {
   if (IsPcsSpace(from) && IsPcsSpace(to)) return true;
   const auto cmyk = [](cmsColorSpaceSignature s) { return s == cmsSigCmykData || s == cmsSigMCH4Data; };
   return cmyk(from) && cmyk(to);
+}
+
+// The class, data space and connection space Little CMS will report for these ICC
+// bytes must be signatures it names: it hands them back as enumerations, which cannot
+// hold arbitrary 32-bit values, and it would take an unknown space for three channels.
+bool HeaderSignaturesKnown(const std::vector<std::uint8_t>& icc) {
+  static constexpr std::uint32_t kClasses[] = {
+      cmsSigInputClass,    cmsSigDisplayClass,    cmsSigOutputClass,     cmsSigLinkClass,
+      cmsSigAbstractClass, cmsSigColorSpaceClass, cmsSigNamedColorClass,
+  };
+  static constexpr std::uint32_t kSpaces[] = {
+      cmsSigXYZData,     cmsSigLabData,     cmsSigLuvData,     cmsSigYCbCrData,   cmsSigYxyData,     cmsSigRgbData,
+      cmsSigGrayData,    cmsSigHsvData,     cmsSigHlsData,     cmsSigCmykData,    cmsSigCmyData,     cmsSigLuvKData,
+      cmsSigMCH1Data,    cmsSigMCH2Data,    cmsSigMCH3Data,    cmsSigMCH4Data,    cmsSigMCH5Data,    cmsSigMCH6Data,
+      cmsSigMCH7Data,    cmsSigMCH8Data,    cmsSigMCH9Data,    cmsSigMCHAData,    cmsSigMCHBData,    cmsSigMCHCData,
+      cmsSigMCHDData,    cmsSigMCHEData,    cmsSigMCHFData,    cmsSig1colorData,  cmsSig2colorData,  cmsSig3colorData,
+      cmsSig4colorData,  cmsSig5colorData,  cmsSig6colorData,  cmsSig7colorData,  cmsSig8colorData,  cmsSig9colorData,
+      cmsSig10colorData, cmsSig11colorData, cmsSig12colorData, cmsSig13colorData, cmsSig14colorData, cmsSig15colorData,
+  };
+  if (icc.size() < 24) return false;
+  const auto at = [&icc](size_t i) {
+    return std::uint32_t{icc[i]} << 24 | std::uint32_t{icc[i + 1]} << 16 | std::uint32_t{icc[i + 2]} << 8 | icc[i + 3];
+  };
+  const auto in = [](const auto& list, std::uint32_t v) {
+    return std::find(std::begin(list), std::end(list), v) != std::end(list);
+  };
+  return in(kClasses, at(12)) && in(kSpaces, at(16)) && in(kSpaces, at(20));
 }
 
 }  // namespace
@@ -60,6 +88,7 @@ DWORD Chain::Build(const HPROFILE* handles, DWORD count, const DWORD* intents, D
   std::vector<std::uint8_t> bytes;
   for (DWORD i = 0; i < count; ++i) {
     if (!SerializeProfile(handles[i], bytes)) return ERROR_INVALID_HANDLE;
+    if (!HeaderSignaturesKnown(bytes)) return ERROR_INVALID_PROFILE;
     cmsHPROFILE p = cmsOpenProfileFromMemTHR(context_, bytes.data(), static_cast<cmsUInt32Number>(bytes.size()));
     if (!p) return ERROR_INVALID_PROFILE;
     profiles_.push_back(p);
@@ -172,7 +201,7 @@ cmsHTRANSFORM Transform::Bitmap(cmsUInt32Number in_format, cmsUInt32Number out_f
 const GamutCheck* Transform::Gamut(DWORD& error) {
   std::lock_guard<std::mutex> lock(mutex_);
   if (!gamut_made_) {
-    error = GamutCheck::Create(chain_->context(), chain_->profiles().back(), gamut_);
+    error = GamutCheck::Create(chain_->context(), chain_->profiles().back(), chain_->steps().back(), gamut_);
     if (error != ERROR_SUCCESS) return nullptr;
     gamut_made_ = true;
   }
