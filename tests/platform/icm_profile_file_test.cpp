@@ -340,7 +340,7 @@ TEST_F(ColorDirectory, UninstallDeletesOnlyWhenAskedAndOnlyInTheDirectory) {
   const std::string path = CopyOf("sRGB.icc", "w.icc");
   ASSERT_TRUE(InstallColorProfileA(nullptr, path.c_str()));
   EXPECT_WIN32(UninstallColorProfileA("machine", "w.icc", TRUE), FALSE, ERROR_INVALID_PARAMETER);
-  EXPECT_WIN32(UninstallColorProfileA(nullptr, "", TRUE), FALSE, ERROR_INVALID_PARAMETER);
+  for (const char* bad : {"", ".", "..", "Z:\\tmp\\"}) EXPECT_WIN32(UninstallColorProfileA(nullptr, bad, TRUE), FALSE, ERROR_INVALID_PARAMETER);
   EXPECT_WIN32(UninstallColorProfileA(nullptr, "missing.icc", TRUE), FALSE, ERROR_FILE_NOT_FOUND);
   EXPECT_WIN32(UninstallColorProfileA(nullptr, "w.icc", FALSE), TRUE, ERROR_SUCCESS);
   EXPECT_TRUE(FileExists(colorDir_ + "/w.icc"));
@@ -348,6 +348,16 @@ TEST_F(ColorDirectory, UninstallDeletesOnlyWhenAskedAndOnlyInTheDirectory) {
   EXPECT_WIN32(UninstallColorProfileA(nullptr, path.c_str(), TRUE), TRUE, ERROR_SUCCESS);
   EXPECT_FALSE(FileExists(colorDir_ + "/w.icc"));
   EXPECT_TRUE(FileExists(Posix("w.icc")));
+}
+
+TEST_F(ProfileFiles, ARootedPathWithoutADriveIsOnDriveZ) {
+  CopyOf("sRGB.icc", "rooted.icc");
+  std::string rooted = Posix("rooted.icc");
+  for (char& c : rooted)
+    if (c == '/') c = '\\';
+  HPROFILE h = OpenPath(rooted, PROFILE_READ, OPEN_EXISTING);
+  EXPECT_NE(h, nullptr);
+  CloseColorProfile(h);
 }
 
 TEST_F(ProfileFiles, SpecialFilesAreNotProfiles) {

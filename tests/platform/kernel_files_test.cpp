@@ -5,6 +5,7 @@
 #include <signal.h>
 #include <sys/resource.h>
 #include <sys/stat.h>
+#include <sys/wait.h>
 #include <unistd.h>
 
 #include <cstring>
@@ -140,10 +141,19 @@ TEST_F(CopyFileATest, WritesThroughSymbolicLinksAndReplacesHardLinks) {
   EXPECT_EQ(Get("shared"), "old");
 }
 
-TEST_F(CopyFileATest, NeverLeavesAStagedFileBeside) {
+// A staged file is named after its program; one left by a program that has ended is
+// removed by the next copy into its folder, and a live program's is kept.
+TEST_F(CopyFileATest, NeverLeavesAStagedFileBesideAndRemovesThoseOfEndedPrograms) {
+  const pid_t child = fork();
+  if (child == 0) _exit(0);
+  waitpid(child, nullptr, 0);
+  const std::string ended = ".tw-save-" + std::to_string(child) + "-a";
+  const std::string mine = ".tw-save-" + std::to_string(getpid()) + "-b";
+  const std::string init = ".tw-save-1-c";
+  for (const std::string& name : {ended, mine, init, std::string(".tw-other")}) Put(name, "x");
   Put("src", std::string(100000, 's'));
   for (int i = 0; i < 3; ++i) EXPECT_TRUE(CopyFileA(Win("src").c_str(), Win("dst").c_str(), FALSE));
-  EXPECT_EQ(Listing(), (std::set<std::string>{"src", "dst", "ro", "dir"}));
+  EXPECT_EQ(Listing(), (std::set<std::string>{"src", "dst", "ro", "dir", mine, init, ".tw-other"}));
 }
 
 TEST_F(CopyFileATest, CopiesContentTimeAndReadOnlyBitAndReplacesWhole) {

@@ -93,6 +93,14 @@ TEST_F(InternalsTest, TemporaryNamesCountFromZeroAfterStartUp) {
   EXPECT_FALSE(MakeTempName(tiny, sizeof tiny));
   ASSERT_TRUE(MakeTempName(name, sizeof name));
   EXPECT_EQ(std::string(name), folder + "2");
+  EXPECT_FALSE(MakeTempName(nullptr, sizeof name));
+  EXPECT_FALSE(MakeTempName(name, 0));
+  // Without a working folder of its own the plugin names no copy at all.
+  WorkingFolderPath[0] = '\0';
+  EXPECT_FALSE(MakeTempName(name, sizeof name));
+  std::strcpy(WorkingFolderPath, folder.c_str());
+  ASSERT_TRUE(MakeTempName(name, sizeof name));
+  EXPECT_EQ(std::string(name), folder + "3");
 }
 
 TEST(TempFolder, IsTheExecutablesFolderPlusTemp) {

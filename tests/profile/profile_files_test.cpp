@@ -5,6 +5,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cstdio>
 #include <cstdlib>
 
@@ -97,6 +98,7 @@ TEST_F(ProfileFileTest, StartUpSweepsTheFoldersOfEndedProgramsOnly) {
     ASSERT_EQ(mkdir(folder.c_str(), 0777), 0);
     ProfileFiles::Write(folder + "lock", {});
     ProfileFiles::Write(folder + "0", {'x'});
+    ProfileFiles::Write(folder + "z", {'x'});
     chmod((folder + "0").c_str(), 0444);
   }
   const int held = open((live + "lock").c_str(), O_RDWR);
@@ -108,6 +110,37 @@ TEST_F(ProfileFileTest, StartUpSweepsTheFoldersOfEndedProgramsOnly) {
   EXPECT_TRUE(ProfileFiles::Exists(live + "0"));
   close(held);
   std::system(("rm -rf '" + live + "'").c_str());
+}
+
+TEST_F(ProfileFileTest, EachConstructorReportsWhatFailedAndOnlyThat) {
+  const std::string good = files.Copy("sRGB.icc", "good.icc"), bad = files.Path("bad.icc");
+  ProfileFiles::Write(bad, std::vector<char>(200, 'x'));
+  Object d = Debugger();
+  const auto traced = [&](const char* text) {
+    return std::find(log.entries.begin(), log.entries.end(), std::string("DebugString:") + text) != log.entries.end();
+  };
+  Object ok = Open(good);
+  EXPECT_EQ(Error(), 0);
+  EXPECT_FALSE(traced("Error opening copied profile"));
+  Object unreadable = Open(bad);
+  EXPECT_EQ(Error(), 2011);  // ERROR_INVALID_PROFILE
+  EXPECT_TRUE(traced("Error opening copied profile"));
+  log.entries.clear();
+  // From a profile that has no working copy: the copy to f fails on its empty path.
+  Object empty = rt->New("Profile", {Object(), Object()});
+  Object copy = rt->New("Profile", {rt->MakeFolderItem(files.Path("copy.icc")), empty});
+  EXPECT_EQ(Error(), 3);  // ERROR_PATH_NOT_FOUND
+  EXPECT_TRUE(traced("Error copying profile to new path"));
+  EXPECT_FALSE(ProfileFiles::Exists(files.Path("copy.icc")));
+}
+
+TEST_F(ProfileFileTest, DestroyingAnEmptyProfileReportsTheCopyItCannotDelete) {
+  {
+    Object empty = rt->New("Profile", {Object(), Object()});  // nil p: nothing made
+    Object d = Debugger();
+  }
+  EXPECT_EQ(Error(), 3);  // ERROR_PATH_NOT_FOUND for the empty path
+  EXPECT_NE(std::find(log.entries.begin(), log.entries.end(), "DebugString:Could not delete file"), log.entries.end());
 }
 
 TEST_F(ProfileFileTest, TheIntentConstructorsInstalledCopyGoesWithItsObject) {
