@@ -101,6 +101,10 @@ TEST_F(ProfileFileTest, StartUpSweepsTheFoldersOfEndedProgramsOnly) {
     ProfileFiles::Write(folder + "z", {'x'});
     chmod((folder + "0").c_str(), 0444);
   }
+  // This program's own lock admits nobody else, not even to share it.
+  const int own = open((ProfileFiles::PluginWorkingFolder() + "lock").c_str(), O_RDONLY);
+  EXPECT_NE(flock(own, LOCK_SH | LOCK_NB), 0);
+  close(own);
   const int held = open((live + "lock").c_str(), O_RDWR);
   ASSERT_EQ(flock(held, LOCK_EX), 0);
   rt->CallGlobal("halvoUnregisterDebugger");
@@ -132,6 +136,23 @@ TEST_F(ProfileFileTest, EachConstructorReportsWhatFailedAndOnlyThat) {
   EXPECT_EQ(Error(), 3);  // ERROR_PATH_NOT_FOUND
   EXPECT_TRUE(traced("Error copying profile to new path"));
   EXPECT_FALSE(ProfileFiles::Exists(files.Path("copy.icc")));
+}
+
+TEST_F(ProfileFileTest, SavesTraceTheirCopyAndRefuseAPathTooLongToHold) {
+  const std::string f = files.Copy("sRGB.icc", "a.icc");
+  Object p = Open(f);
+  Object d = Debugger();
+  rt->Call(p, "SaveProfile");
+  ASSERT_EQ(log.entries.size(), 3u);
+  EXPECT_EQ(log.entries[0], "DebugString:saveprofile");
+  EXPECT_EQ(log.entries[1].rfind("DebugString:Z:\\", 0), 0u);
+  EXPECT_EQ(log.entries[1].substr(log.entries[1].size() - 2), "\\0");  // the working copy
+  EXPECT_EQ(log.entries[2], "DebugString:" + rt->FolderItemPath(rt->MakeFolderItem(f)));
+  log.entries.clear();
+  rt->Call(p, "SaveProfileAs", {rt->MakeFolderItem(files.Path(std::string(300, 'n')))});
+  EXPECT_EQ(Error(), 206);  // ERROR_FILENAME_EXCED_RANGE
+  EXPECT_EQ(log.entries,
+            (std::vector<std::string>{"DebugError:206,", "DebugString:Error copying profile to new path"}));
 }
 
 TEST_F(ProfileFileTest, DestroyingAnEmptyProfileReportsTheCopyItCannotDelete) {
