@@ -17,7 +17,15 @@ int32_t HALVO_ICMReadTagXYZ(HPROFILE profile, TAGTYPE tag, double* x, double* y,
 
 // textType and textDescriptionType (and, when reading, multiLocalizedUnicodeType):
 // tags/text_codec.cpp. The readers are called twice: without a buffer for the size to
-// allocate, then with a buffer of that size.
+// allocate, then with a buffer of that size; the caller takes as many bytes from the
+// buffer as the second call answers. Whatever the type, the buffer then also holds a
+// zero byte behind those bytes.
+//   text tag:  first the element's whole size; then the bytes behind the type header,
+//              the stored terminating zero included (L + 1 for a text of L bytes).
+//   desc tag:  first the ASCII count + 1; then the ASCII count - 1 (the text's length).
+//   mluc tag:  (either reader) first the decoded text's length + 1; then its length.
+// Failure: -1 from the text reader, 0 from the description reader; either way the
+// caller sizes nothing from it.
 void HALVO_ICMWriteTagText(HPROFILE profile, TAGTYPE tag, const char* text);
 int32_t HALVO_ICMReadTagText(HPROFILE profile, TAGTYPE tag, char* buffer);
 void HALVO_ICMWriteTagDesc(HPROFILE profile, TAGTYPE tag, const char* text);
