@@ -6,7 +6,10 @@
 #include "debugger.h"
 #include "error_state.h"
 #include "host_bridge.h"
+#include "matrix.h"
 #include "profile.h"
+#include "vector.h"
+#include "vector_nc.h"
 
 namespace {
 
@@ -14,6 +17,9 @@ namespace {
 // CMColor, Profile, ColorWorld, cLut. A class joins this list once it is built.
 REALclassDefinition* const kClasses[] = {
     &halvoDebuggerClass,
+    &MatrixClass,
+    &VectorClass,
+    &VectorNCClass,
     &CMColorClass,
     &ProfileClass,
     &ColorWorldClass,

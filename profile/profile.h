@@ -28,6 +28,9 @@ HPROFILE ProfileHandle(REALobject profile);
 // "Error opening profile header" and reports the system error; the header stays zero.
 BOOL ReadProfileHeader(HPROFILE profile, PROFILEHEADER* header);
 
+// A named-colour index outside 1 to the number of colours in the profile's list.
+constexpr int32_t kErrorNamedColorIndex = -3;
+
 // Members of the class, defined with their concerns and gathered in profile_class.cpp.
 namespace profile_members {
 void ConstructFromFile(REALobject self, REALfolderItem f);
@@ -41,6 +44,35 @@ REALfolderItem GetLocation(REALobject self, intptr_t);
 int32_t GetLocationType(REALobject self, intptr_t);
 int32_t GetRefCount(REALobject self, intptr_t);
 bool GetModified(REALobject self, intptr_t);
+
+// Tag access: profile/tag_access.cpp
+int32_t GetTagCount(REALobject self, intptr_t);
+bool TagExists(REALobject self, REALstring tag);
+REALstring TagName(REALobject self, int32_t index);
+REALstring TagDataAt(REALobject self, int32_t index);
+REALstring TagDataOf(REALobject self, REALstring tag);
+int32_t RemoveTag(REALobject self, REALstring tag);
+int32_t SetTagData(REALobject self, REALstring tag, REALstring data);
+int32_t SetTagRef(REALobject self, REALstring tag, REALstring ref);
+void GetXYZTag(REALobject self, REALstring tag, double* wx, double* wy, double* wz);
+void SetXYZTag(REALobject self, REALstring tag, double wx, double wy, double wz);
+REALstring GetTextTypeTag(REALobject self, REALstring tag);
+void SetTextTypeTag(REALobject self, REALstring tag, REALstring data);
+REALstring GetDescTypeTag(REALobject self, REALstring tag);
+void SetDescTypeTag(REALobject self, REALstring tag, REALstring data);
+REALstring GetName(REALobject self, intptr_t);
+void SetName(REALobject self, intptr_t, REALstring value);
+REALstring GetCopyright(REALobject self, intptr_t);
+void SetCopyright(REALobject self, intptr_t, REALstring value);
+int32_t GetNamedColorCount(REALobject self, intptr_t);
+int32_t GetNamedColorChannels(REALobject self, intptr_t);
+REALstring GetNamedColorDevicespace(REALobject self, intptr_t);
+REALstring GetNamedColorPCSspace(REALobject self, intptr_t);
+REALstring GetNamedColorPrefix(REALobject self, intptr_t);
+REALstring GetNamedColorSuffix(REALobject self, intptr_t);
+REALstring GetNamedColorName(REALobject self, int32_t index);
+void GetIndNamedColorPCS(REALobject self, int32_t index, double* l, double* a, double* b);
+int32_t GetNamedColorIndex(REALobject self, REALstring name);
 }  // namespace profile_members
 
 #endif

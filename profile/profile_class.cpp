@@ -4,11 +4,13 @@
 #include "class_tables.h"
 #include "header_fields.h"
 #include "profile.h"
+#include "tag_codecs.h"
 
 namespace {
 
 using namespace header_fields;
 using namespace profile_members;
+using namespace tag_members;
 
 // A header property: its getter and setter with their no-profile behaviours.
 template <class Field, NoProfile GetPolicy, NoProfile SetPolicy>
@@ -74,8 +76,17 @@ REALproperty properties[] = {
     Header<DateField<kDate + 4, false>, kUntested>("Hour", "Integer"),
     Header<DateField<kDate + 8, true>, kUntested>("Minute", "Integer"),
     Header<DateField<kDate + 8, false>, kUntested>("Second", "Integer"),
+    {nullptr, "TagCount", "Integer", 0, AsProc(&GetTagCount), nullptr, 0, 0, 0, 0},
     {nullptr, "Modified", "Boolean", 0, AsProc(&GetModified), nullptr, 0, 0, 0, 0},
     {nullptr, "RefCount", "Integer", 0, AsProc(&GetRefCount), nullptr, 0, 0, 0, 0},
+    {nullptr, "NamedColorCount", "Integer", 0, AsProc(&GetNamedColorCount), nullptr, 0, 0, 0, 0},
+    {nullptr, "NamedColorChannels", "Integer", 0, AsProc(&GetNamedColorChannels), nullptr, 0, 0, 0, 0},
+    {nullptr, "NamedColorDevicespace", "String", 0, AsProc(&GetNamedColorDevicespace), nullptr, 0, 0, 0, 0},
+    {nullptr, "NamedColorPCSspace", "String", 0, AsProc(&GetNamedColorPCSspace), nullptr, 0, 0, 0, 0},
+    {nullptr, "NamedColorPrefix", "String", 0, AsProc(&GetNamedColorPrefix), nullptr, 0, 0, 0, 0},
+    {nullptr, "NamedColorSuffix", "String", 0, AsProc(&GetNamedColorSuffix), nullptr, 0, 0, 0, 0},
+    {nullptr, "Name", "String", 0, AsProc(&GetName), AsProc(&SetName), 0, 0, 0, 0},
+    {nullptr, "Copyright", "String", 0, AsProc(&GetCopyright), AsProc(&SetCopyright), 0, 0, 0, 0},
 };
 
 REALmethodDefinition methods[] = {
@@ -86,6 +97,27 @@ REALmethodDefinition methods[] = {
     {AsProc(&SaveProfileAs), nullptr, "SaveProfileAs(f as folderitem)"},
     {AsProc(&SaveProfile), nullptr, "SaveProfile()"},
     {AsProc(&ValidProfile), nullptr, "ValidProfile() as Boolean"},
+    {AsProc(&TagExists), nullptr, "TagExists(tag as String) as Boolean"},
+    {AsProc(&RemoveTag), nullptr, "RemoveTag(tag as String) as Integer"},
+    {AsProc(&TagName), nullptr, "TagName(index as Integer) as String"},
+    {AsProc(&TagDataAt), nullptr, "TagData(index as Integer) as String"},
+    {AsProc(&TagDataOf), nullptr, "TagData(tag as String) as String"},
+    {AsProc(&SetTagData), nullptr, "SetTagData(tag as String, data as String) as Integer"},
+    {AsProc(&SetTagRef), nullptr, "SetTagRef(tag as String, ref as String) as Integer"},
+    {AsProc(&GetXYZTag), nullptr, "GetXYZTag(tag as String, Byref WX as Double, Byref WY as Double, Byref WZ as Double)"},
+    {AsProc(&SetXYZTag), nullptr, "SetXYZTag(tag as String, WX as Double, WY as Double, WZ as Double)"},
+    {AsProc(&GetNamedColorIndex), nullptr, "GetNamedColorIndex(name as String) as Integer"},
+    {AsProc(&GetNamedColorName), nullptr, "GetNamedColorName(index as Integer) as String"},
+    {AsProc(&GetIndNamedColorPCS), nullptr,
+     "GetIndNamedColorPCS(index as Integer, byref Ll as double,byref La as double,byref Lb as double)"},
+    {AsProc(&GetTRC), nullptr, "GetTRC(tag as String, v as Vector)"},
+    {AsProc(&SetTRC), nullptr, "SetTRC(tag as String, v as Vector)"},
+    {AsProc(&GetNC), nullptr, "GetNC(tag as String, v as VectorNC)"},
+    {AsProc(&SetNC), nullptr, "SetNC(tag as String, v as VectorNC)"},
+    {AsProc(&GetTextTypeTag), nullptr, "GetTextTypeTag(tag as String) as String"},
+    {AsProc(&SetTextTypeTag), nullptr, "SetTextTypeTag(tag as String, data as String)"},
+    {AsProc(&GetDescTypeTag), nullptr, "GetDescTypeTag(tag as String) as String"},
+    {AsProc(&SetDescTypeTag), nullptr, "SetDescTypeTag(tag as String, data as String)"},
 };
 
 }  // namespace

@@ -10,16 +10,29 @@
 
 namespace tool {
 
+// One change the edit command makes, in the order given.
+struct Edit {
+  enum Kind { Description, Copyright, Remove, CopyTag } kind;
+  std::string value;  // the text, the tag to remove, or NEW=EXISTING
+};
+
 struct Options {
   bool json = false;
   int intent = -1;                // rendering intent for source and destination; -1 keeps theirs
   std::vector<std::string> via;   // up to two profiles between source and destination
+  bool raw = false;               // tag: the bytes as a hex dump
+  std::vector<Edit> edits;        // edit: the changes
+  std::string output;             // edit: save here instead of in place
 };
 
 int ListCommand(Session& session, const std::vector<std::string>& args, const Options& options);
 int InfoCommand(Session& session, const std::vector<std::string>& args, const Options& options);
 int ConvertCommand(Session& session, const std::vector<std::string>& args, const Options& options, std::FILE* input);
 int GamutCommand(Session& session, const std::vector<std::string>& args, const Options& options);
+// Tag listing, one tag decoded, and tag edits: tools/tag_commands.cpp
+int TagsCommand(Session& session, const std::vector<std::string>& args, const Options& options);
+int TagCommand(Session& session, const std::vector<std::string>& args, const Options& options);
+int EditCommand(Session& session, const std::vector<std::string>& args, const Options& options);
 
 }  // namespace tool
 

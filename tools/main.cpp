@@ -28,6 +28,11 @@ void PrintUsage(std::FILE* to) {
       "                               no values, reads one colour a line from standard input\n"
       "  gamut PROFILE L a b          whether a Lab colour lies inside PROFILE's gamut\n"
       "  list                         the classes and global methods the plugin registers\n"
+      "  tags PROFILE                 every tag: index, signature, type, offset and size in\n"
+      "                               the file, and the tags whose data it shares\n"
+      "  tag PROFILE SIG              one tag decoded: a curve's entries or gamma, an XYZ,\n"
+      "                               a text or description, a named-colour list\n"
+      "  edit PROFILE EDIT... [-o OUT]  change tags, then save the profile (to OUT if given)\n"
       "\n"
       "A PROFILE is a file, or one of the built-in profiles:\n",
       to);
@@ -44,10 +49,20 @@ void PrintUsage(std::FILE* to) {
       "                  1 relative colorimetric, 2 saturation, 3 absolute colorimetric)\n"
       "  --via PROFILE   a profile between source and destination (up to two)\n"
       "  --json          machine-readable output\n"
+      "  --raw           tag: the tag's bytes as a hex dump\n"
       "  --verbose       on failure, also show the plugin's trace\n"
       "  --plugin PATH   the plugin to load (default: $TINTWELL_PLUGIN, else\n"
       "                  ../lib/libtintwell.so beside this program)\n"
       "  -h, --help      this help\n"
+      "\n"
+      "Edits (edit command), applied in the order given:\n"
+      "  --desc TEXT          the description ('desc' tag)\n"
+      "  --copyright TEXT     the copyright ('cprt' tag)\n"
+      "  --remove SIG         remove a tag (may be repeated)\n"
+      "  --copy-tag NEW=SIG   make tag NEW share the data of tag SIG (may be repeated)\n"
+      "  -o OUT               save the edited profile as OUT; without it the profile's\n"
+      "                       own file is replaced\n"
+      "A tag signature of fewer than 4 characters is padded with spaces ('XYZ').\n"
       "\n"
       "Exit status: 0 success, 1 a failed job, 2 a usage error.\n",
       to);
@@ -90,6 +105,16 @@ int main(int argc, char** argv) {
       return 0;
     } else if (arg == "--json") {
       options.json = true;
+    } else if (arg == "--raw") {
+      options.raw = true;
+    } else if (arg == "--desc" || arg == "--copyright" || arg == "--remove" || arg == "--copy-tag" || arg == "-o") {
+      if (i + 1 >= argc) return Usage(arg + " needs a value");
+      const std::string v = argv[++i];
+      if (arg == "-o") options.output = v;
+      if (arg == "--desc") options.edits.push_back({tool::Edit::Description, v});
+      if (arg == "--copyright") options.edits.push_back({tool::Edit::Copyright, v});
+      if (arg == "--remove") options.edits.push_back({tool::Edit::Remove, v});
+      if (arg == "--copy-tag") options.edits.push_back({tool::Edit::CopyTag, v});
     } else if (arg == "--verbose") {
       verbose = true;
     } else if (arg == "--plugin" || arg == "--via" || arg == "--intent") {
@@ -112,8 +137,12 @@ int main(int argc, char** argv) {
   if (words.empty()) return Usage("no command given");
   const std::string command = words.front();
   const std::vector<std::string> args(words.begin() + 1, words.end());
-  if (command != "info" && command != "convert" && command != "gamut" && command != "list")
+  if (command != "info" && command != "convert" && command != "gamut" && command != "list" && command != "tags" &&
+      command != "tag" && command != "edit")
     return Usage("unknown command " + command);
+  if (options.raw && command != "tag") return Usage("--raw belongs to the tag command");
+  if ((!options.edits.empty() || !options.output.empty()) && command != "edit")
+    return Usage("--desc, --copyright, --remove, --copy-tag and -o belong to the edit command");
 
   std::unique_ptr<tool::Session> session;
   try {
@@ -121,6 +150,9 @@ int main(int argc, char** argv) {
     if (command == "info") return tool::InfoCommand(*session, args, options);
     if (command == "convert") return tool::ConvertCommand(*session, args, options, stdin);
     if (command == "gamut") return tool::GamutCommand(*session, args, options);
+    if (command == "tags") return tool::TagsCommand(*session, args, options);
+    if (command == "tag") return tool::TagCommand(*session, args, options);
+    if (command == "edit") return tool::EditCommand(*session, args, options);
     return tool::ListCommand(*session, args, options);
   } catch (const tool::UsageError& e) {
     return Usage(e.what());

@@ -70,12 +70,15 @@ void Session::Check(const std::string& message) {
   if (code != 0) throw JobError(message, code);
 }
 
+std::string Session::ProfilePath(const std::string& nameOrPath) {
+  if (access(nameOrPath.c_str(), F_OK) == 0) return nameOrPath;
+  for (const BuiltinProfile& b : BuiltinProfiles())
+    if (host::EqualsIgnoreCase(b.name, nameOrPath)) return b.path;
+  return nameOrPath;
+}
+
 host::Object Session::OpenProfile(const std::string& nameOrPath) {
-  std::string path = nameOrPath;
-  if (access(path.c_str(), F_OK) != 0) {
-    for (const BuiltinProfile& b : BuiltinProfiles())
-      if (host::EqualsIgnoreCase(b.name, nameOrPath)) path = b.path;
-  }
+  const std::string path = ProfilePath(nameOrPath);
   if (access(path.c_str(), R_OK) != 0) throw JobError("cannot read profile " + nameOrPath, 0);
   host::Object profile = runtime_->New("Profile", {runtime_->MakeFolderItem(path)});
   Check("cannot open profile " + nameOrPath);

@@ -34,6 +34,9 @@ class Session {
 
   // Opens a profile given as a file path or the name of a built-in profile.
   host::Object OpenProfile(const std::string& nameOrPath);
+  // The file a profile argument names: the path itself when it exists, else the file of
+  // the built-in profile of that name, else the argument unchanged.
+  static std::string ProfilePath(const std::string& nameOrPath);
   // The traces the plugin sent since the last call (texts and values, one a line).
   std::vector<std::string> TakeTraces();
 

@@ -244,3 +244,66 @@ TEST(SerializeProfile, LaysOutAlignedSharedData) {
 }
 
 }  // namespace
+
+namespace {
+
+using namespace icctest;
+
+TEST(SetColorProfileElementReference, ParameterChecksThenSharing) {
+  HPROFILE readOnly = OpenMemory(SampleProfile(), PROFILE_READ);
+  EXPECT_WIN32(SetColorProfileElementReference(readOnly, Sig("bTRC"), Sig("rTRC")), FALSE, ERROR_ACCESS_DENIED);
+  EXPECT_TRUE(CloseColorProfile(readOnly));
+
+  HPROFILE h = OpenMemory(SampleProfile());
+  const struct {
+    const char* what;
+    HPROFILE handle;
+    TAGTYPE newTag, refTag;
+    DWORD error;
+  } refused[] = {
+      {"no handle", nullptr, Sig("bTRC"), Sig("rTRC"), ERROR_INVALID_HANDLE},
+      {"tag 0", h, 0, Sig("rTRC"), ERROR_INVALID_PARAMETER},
+      {"absent reference", h, Sig("bTRC"), Sig("cprt"), ERROR_TAG_NOT_FOUND},
+      {"new tag exists", h, Sig("gTRC"), Sig("wtpt"), ERROR_DUPLICATE_TAG},
+      {"itself", h, Sig("wtpt"), Sig("wtpt"), ERROR_DUPLICATE_TAG},
+  };
+  for (const auto& c : refused) {
+    SCOPED_TRACE(c.what);
+    EXPECT_WIN32(SetColorProfileElementReference(c.handle, c.newTag, c.refTag), FALSE, c.error);
+  }
+  EXPECT_EQ(TagList(h), (std::vector<TAGTYPE>{Sig("wtpt"), Sig("rTRC"), Sig("gTRC")})) << "nothing added";
+
+  EXPECT_WIN32(SetColorProfileElementReference(h, Sig("bXYZ"), Sig("wtpt")), TRUE, ERROR_SUCCESS);
+  EXPECT_EQ(TagList(h), (std::vector<TAGTYPE>{Sig("wtpt"), Sig("rTRC"), Sig("gTRC"), Sig("bXYZ")}));
+  EXPECT_EQ(Element(h, Sig("bXYZ")), FileBytes(168, 20));
+  for (TAGTYPE tag : {Sig("wtpt"), Sig("bXYZ")}) {
+    BOOL reference = FALSE;
+    DWORD n = 1;
+    std::uint8_t b;
+    ASSERT_TRUE(GetColorProfileElement(h, tag, 0, &n, &b, &reference));
+    EXPECT_TRUE(reference);
+  }
+  // A reference to a reference joins the same data; the saved file holds it once.
+  ASSERT_TRUE(SetColorProfileElementReference(h, Sig("bTRC"), Sig("gTRC")));
+  std::vector<std::uint8_t> saved;
+  ASSERT_TRUE(win32::icm::SerializeProfile(h, saved));
+  const std::vector<TagEntry> table = TagTable(saved);
+  ASSERT_EQ(table.size(), 5u);
+  EXPECT_EQ(BE32(saved, 0), saved.size());
+  EXPECT_EQ(saved.size(), 132u + 5 * 12 + 20 + 16) << "two data blocks, each once, aligned";
+  EXPECT_EQ(table[3].offset, table[0].offset);
+  EXPECT_EQ(table[4].offset, table[1].offset);
+  EXPECT_EQ(table[4].size, 14u);
+
+  // Removing the original leaves the reference its data; rewriting the reference
+  // leaves its sibling intact.
+  ASSERT_TRUE(SetColorProfileElementSize(h, Sig("wtpt"), 0));
+  EXPECT_EQ(Element(h, Sig("bXYZ")), FileBytes(168, 20));
+  std::uint8_t zero[2] = {0, 0};
+  DWORD two = 2;
+  ASSERT_TRUE(SetColorProfileElement(h, Sig("bTRC"), 0, &two, zero));
+  EXPECT_EQ(Element(h, Sig("gTRC")), FileBytes(188, 14));
+  EXPECT_TRUE(CloseColorProfile(h));
+}
+
+}  // namespace

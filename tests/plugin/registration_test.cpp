@@ -19,7 +19,8 @@ TEST_F(PluginTest, RegistersItsClassesAndGlobalsWithTheStoredDeclarations) {
   const auto classes = rt->Classes();
   std::vector<std::string> names;
   for (const auto* c : classes) names.push_back(c->name);
-  EXPECT_EQ(names, (std::vector<std::string>{"halvoDebugger", "CMColor", "Profile", "ColorWorld"}));
+  EXPECT_EQ(names, (std::vector<std::string>{"halvoDebugger", "Matrix", "Vector", "VectorNC", "CMColor", "Profile",
+                                             "ColorWorld"}));
   const host::ClassInfo& debugger = *classes[0];
   EXPECT_EQ(debugger.name, "halvoDebugger");
   EXPECT_EQ(debugger.dataSize, 1u);
@@ -42,13 +43,34 @@ TEST_F(PluginTest, RegistersItsClassesAndGlobalsWithTheStoredDeclarations) {
                                                "NewConcatColorWorld(keyindex as Integer, p1 as Profile, p2 as "
                                                "Profile, p3 as Profile, p4 as Profile) as ColorWorld"}));
 
-  const host::ClassInfo& color = *classes[1];
+  const host::ClassInfo& color = *classes[4];
   EXPECT_EQ(color.properties.size(), 25u);
   EXPECT_EQ(color.methods.size(), 16u);
   // Two declarations share one routine.
   EXPECT_EQ(color.methods[1].declaration, "CMColor(c as CMColor)");
   EXPECT_EQ(color.methods[2].declaration, "copy(c as CMColor)");
   EXPECT_EQ(color.methods[1].function, color.methods[2].function);
+
+  std::vector<std::string> profileMethods;
+  for (const auto& m : classes[5]->methods) profileMethods.push_back(m.declaration);
+  EXPECT_EQ(profileMethods,
+            (std::vector<std::string>{
+                "Profile(f as Folderitem)",
+                "Profile(f as Folderitem, intent as Integer, quality as Integer, CMM as String)",
+                "Profile(f as Folderitem, p as Profile)", "SaveProfileAs(f as folderitem)", "SaveProfile()",
+                "ValidProfile() as Boolean", "TagExists(tag as String) as Boolean",
+                "RemoveTag(tag as String) as Integer", "TagName(index as Integer) as String",
+                "TagData(index as Integer) as String", "TagData(tag as String) as String",
+                "SetTagData(tag as String, data as String) as Integer",
+                "SetTagRef(tag as String, ref as String) as Integer",
+                "GetXYZTag(tag as String, Byref WX as Double, Byref WY as Double, Byref WZ as Double)",
+                "SetXYZTag(tag as String, WX as Double, WY as Double, WZ as Double)",
+                "GetNamedColorIndex(name as String) as Integer", "GetNamedColorName(index as Integer) as String",
+                "GetIndNamedColorPCS(index as Integer, byref Ll as double,byref La as double,byref Lb as double)",
+                "GetTRC(tag as String, v as Vector)", "SetTRC(tag as String, v as Vector)",
+                "GetNC(tag as String, v as VectorNC)", "SetNC(tag as String, v as VectorNC)",
+                "GetTextTypeTag(tag as String) as String", "SetTextTypeTag(tag as String, data as String)",
+                "GetDescTypeTag(tag as String) as String", "SetDescTypeTag(tag as String, data as String)"}));
 }
 
 TEST_F(PluginTest, StartsByAnnouncingItsVersionThenRegisters) {

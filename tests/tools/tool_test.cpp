@@ -169,3 +169,90 @@ TEST(Tool, FailedJobsExitOneWithTheReason) {
 }
 
 }  // namespace
+
+namespace {
+
+// A private copy of a system profile for the edit commands.
+std::string CopyProfile(const std::string& systemPath, const std::string& name) {
+  const std::string to = ::testing::TempDir() + "tw_" + std::to_string(getpid()) + "_" + name;
+  std::ifstream in(systemPath, std::ios::binary);
+  std::ofstream(to, std::ios::binary) << in.rdbuf();
+  return to;
+}
+
+bool Has(const std::string& text, const std::string& part) { return text.find(part) != std::string::npos; }
+
+TEST(Tool, EditsThenListsAndDecodesTags) {
+  const std::string in = CopyProfile(TINTWELL_ICC_DIR "/sRGB.icc", "in.icc");
+  const std::string out = CopyProfile(TINTWELL_ICC_DIR "/sRGB.icc", "out.icc");
+  const std::string original = Slurp(in);
+  Result r = RunTool("edit " + in + " --copy-tag lumi=wtpt --remove cprt --desc 'Edited here' --copyright '(c) me'"
+                     " --remove dmdd -o " + out);
+  ASSERT_EQ(r.status, 0) << r.err;
+  EXPECT_EQ(Slurp(in), original) << "-o leaves the profile itself alone";
+  r = RunTool("tags " + out);
+  ASSERT_EQ(r.status, 0) << r.err;
+  EXPECT_FALSE(Has(r.out, "dmdd"));
+  EXPECT_TRUE(Has(r.out, "lumi  XYZ ")) << r.out;
+  EXPECT_TRUE(Has(r.out, "shared with wtpt")) << r.out;
+  EXPECT_TRUE(Has(r.out, "shared with lumi")) << r.out;
+  const struct {
+    std::string args, out;
+  } decoded[] = {
+      {"tag " + out + " desc", "Edited here\n"},
+      {"tag " + out + " cprt", "(c) me\n"},
+      {"--json tag " + out + " cprt", "{\"tag\": \"cprt\", \"text\": \"(c) me\"}\n"},
+      {"--raw tag " + out + " cprt", "00000000  74 65 78 74 00 00 00 00  28 63 29 20 6d 65 00     |text....(c) me.|\n"},
+      {"tag " + out + " lumi", RunTool("tag " + out + " wtpt").out},
+      {"tag gray kTRC", "gamma 2.2\n"},  // a pure parametric curve
+      {"tag " TINTWELL_ICC_DIR "/colord/AdobeRGB1998.icc gTRC", "gamma 2.1992\n"},  // 0x0233 / 256
+  };
+  for (const auto& d : decoded) {
+    r = RunTool(d.args);
+    EXPECT_EQ(r.status, 0) << d.args << ": " << r.err;
+    EXPECT_EQ(r.out, d.out) << d.args;
+  }
+  r = RunTool("tag " + out + " rTRC");
+  EXPECT_EQ(r.out.substr(0, r.out.find('\n')), "1024 entries");
+  r = RunTool("--json tags " + out);
+  EXPECT_TRUE(Has(r.out, "\"tag\": \"lumi\", \"type\": \"XYZ \"")) << r.out;
+  r = RunTool("tag " TINTWELL_ICC_DIR "/colord/x11-colors.icc ncl2");
+  ASSERT_EQ(r.status, 0) << r.err;
+  EXPECT_TRUE(Has(r.out, "     1  Light pink  ")) << r.out.substr(0, 300);
+
+  // In place: the profile's own file changes.
+  r = RunTool("edit " + in + " --remove cprt");
+  ASSERT_EQ(r.status, 0) << r.err;
+  EXPECT_NE(Slurp(in), original);
+  EXPECT_EQ(RunTool("tag " + in + " cprt").status, 1);
+}
+
+TEST(Tool, TagCommandsRefuseBadRequests) {
+  const std::string copy = CopyProfile(TINTWELL_ICC_DIR "/sRGB.icc", "bad.icc");
+  const std::string original = Slurp(copy);
+  const struct {
+    std::string args;
+    int status;
+    std::string said;
+  } cases[] = {
+      {"tag srgb zzzz", 1, "no tag 'zzzz'"},
+      {"tag srgb abcde", 2, "1 to 4 characters"},
+      {"tag srgb", 2, "tag needs"},
+      {"tags", 2, "tags needs"},
+      {"--raw tags srgb", 2, "--raw"},
+      {"info srgb -o x.icc", 2, "edit command"},
+      {"edit srgb --desc x", 2, "-o OUT"},
+      {"edit " + copy, 2, "edit needs"},
+      {"edit " + copy + " --copy-tag lumi", 2, "NEW=EXISTING"},
+      {"edit " + copy + " --remove zzzz", 1, "cannot remove tag 'zzzz' (CMError 2012)"},
+      {"edit " + copy + " --copy-tag lumi=zzzz", 1, "(CMError 2012)"},
+  };
+  for (const auto& c : cases) {
+    const Result r = RunTool(c.args);
+    EXPECT_EQ(r.status, c.status) << c.args;
+    EXPECT_TRUE(Has(r.err, c.said)) << c.args << ": " << r.err;
+  }
+  EXPECT_EQ(Slurp(copy), original) << "a failed edit saves nothing";
+}
+
+}  // namespace

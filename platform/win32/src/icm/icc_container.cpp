@@ -157,6 +157,19 @@ DWORD IccContainer::ResizeElement(std::uint32_t signature, std::size_t size) {
   return ERROR_SUCCESS;
 }
 
+DWORD IccContainer::AddReference(std::uint32_t newTag, std::uint32_t refTag) {
+  if (index_.count(newTag) != 0) return ERROR_DUPLICATE_TAG;
+  auto ref = index_.find(refTag);
+  if (ref == index_.end()) return ERROR_TAG_NOT_FOUND;
+  // Only a table entry is added; the data is written once however many entries share it.
+  if (SerializedSize() + kTagEntrySize > kMaxProfileSize) return ERROR_NOT_ENOUGH_MEMORY;
+  tags_.push_back(Tag{newTag, tags_[ref->second].data});
+  index_[newTag] = tags_.size() - 1;
+  byte_size_ = SerializedSize();
+  WriteBE32(header_.data() + kOffsetSize, static_cast<std::uint32_t>(byte_size_));
+  return ERROR_SUCCESS;
+}
+
 void IccContainer::RebuildIndex() {
   index_.clear();
   index_.reserve(tags_.size());

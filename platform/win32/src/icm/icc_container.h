@@ -98,6 +98,11 @@ class IccContainer {
   // would outgrow 32-bit sizes). The size field follows the new layout.
   DWORD ResizeElement(std::uint32_t signature, std::size_t size);
 
+  // Adds an entry for newTag at the end of the table that shares the data of refTag.
+  // Returns ERROR_SUCCESS, ERROR_DUPLICATE_TAG (newTag exists), ERROR_TAG_NOT_FOUND
+  // (refTag is absent) or ERROR_NOT_ENOUGH_MEMORY (the file would outgrow 32-bit sizes).
+  DWORD AddReference(std::uint32_t newTag, std::uint32_t refTag);
+
   // The complete file: tag table in order, each distinct data block once, 4-byte
   // aligned with zero padding, size field set to the total.
   Bytes Serialize() const;

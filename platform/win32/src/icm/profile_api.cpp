@@ -272,3 +272,18 @@ extern "C" BOOL WINAPI SetColorProfileElementSize(HPROFILE hProfile, TAGTYPE tag
     return Succeed();
   });
 }
+
+// Makes newTag a second table entry for refTag's data. Writing either later gives the
+// written one its own copy, as SetColorProfileElementSize and SetColorProfileElement do.
+extern "C" BOOL WINAPI SetColorProfileElementReference(HPROFILE hProfile, TAGTYPE newTag, TAGTYPE refTag) {
+  return Guarded([&]() -> BOOL {
+    auto profile = Lookup(hProfile);
+    if (!profile) return Fail(ERROR_INVALID_HANDLE);
+    if (newTag == 0) return Fail(ERROR_INVALID_PARAMETER);
+    if (!profile->writable) return Fail(ERROR_ACCESS_DENIED);
+    const DWORD code = profile->icc.AddReference(newTag, refTag);
+    if (code != ERROR_SUCCESS) return Fail(code);
+    profile->changed = true;
+    return Succeed();
+  });
+}
