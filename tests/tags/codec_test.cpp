@@ -265,6 +265,11 @@ TEST_F(CodecTest, WritersTraceTheirPiecesAndStopAtTheFirstFailure) {
   Object empty = rt->New("Profile", {nullptr}), d = Debugger();
   rt->Call(empty, "SetTRC", {"rTRC", NewVector({0.25})});  // no open handle
   EXPECT_EQ(Error(), ERROR_INVALID_HANDLE);
+  for (const char* method : {"GetTRC", "SetTRC"}) {  // a nil Vector is refused before anything
+    rt->Get(empty, "Modified");  // clears the last error
+    rt->Call(empty, method, {"rTRC", Object()});
+    EXPECT_EQ(Error(), -1) << method;
+  }
 
   std::vector<char> bytes = ProfileFiles::Read(TINTWELL_ICC_DIR "/sRGB.icc");
   PROFILE source{PROFILE_MEMBUFFER, bytes.data(), DWORD(bytes.size())};
