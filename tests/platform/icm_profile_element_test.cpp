@@ -1,6 +1,8 @@
 // Conformance of the element calls: reads at every boundary, writes, size changes,
 // shared data, and the tag-table queries.
+#include <algorithm>
 #include <cstring>
+#include <tuple>
 
 #include "icc_test_support.h"
 #include "icm/profile_store.h"
@@ -11,27 +13,43 @@ using namespace icctest;
 
 // Table end is 132 + 3 * 12 = 168. wtpt holds file bytes 168..187; rTRC and gTRC share
 // 188..201. MakeProfile fills byte i of the file with i & 0xFF.
-const std::vector<TagEntry> kTable = {
-    {Sig("wtpt"), 168, 20}, {Sig("rTRC"), 188, 14}, {Sig("gTRC"), 188, 14}};
-Bytes SampleProfile() { return MakeProfile(kTable, 36); }
-Bytes FileBytes(std::uint32_t from, std::uint32_t count) {
-  Bytes b(count);
+const Bytes kSample = MakeProfile({{Sig("wtpt"), 168, 20}, {Sig("rTRC"), 188, 14}, {Sig("gTRC"), 188, 14}}, 36);
+// count file bytes from the given one, then zeros up to size.
+Bytes FileBytes(std::uint32_t from, std::uint32_t count, std::uint32_t size = 0) {
+  Bytes b(std::max(count, size), 0);
   for (std::uint32_t i = 0; i < count; ++i) b[i] = static_cast<std::uint8_t>(from + i);
   return b;
 }
+Bytes Element(HPROFILE h, TAGTYPE tag) {
+  DWORD n = 0;
+  GetColorProfileElement(h, tag, 0, &n, nullptr, nullptr);
+  Bytes b(n);
+  EXPECT_TRUE(GetColorProfileElement(h, tag, 0, &n, b.data(), nullptr));
+  return b;
+}
+// Whether a read of the element reports shared data.
+BOOL Shared(HPROFILE h, TAGTYPE tag) {
+  BOOL reference = 7;
+  DWORD n = 1;
+  std::uint8_t b;
+  EXPECT_TRUE(GetColorProfileElement(h, tag, 0, &n, &b, &reference));
+  return reference;
+}
+BOOL Write(HPROFILE h, TAGTYPE tag, DWORD offset, Bytes data) {
+  DWORD n = static_cast<DWORD>(data.size());
+  return SetColorProfileElement(h, tag, offset, &n, data.data());
+}
 
 TEST(GetColorProfileElement, Boundaries) {
-  HPROFILE h = OpenMemory(SampleProfile(), PROFILE_READ);
+  HPROFILE h = OpenMemory(kSample, PROFILE_READ);
   constexpr DWORD kUntouched = 0xCAFE;
   struct Case {
     const char* what;
     TAGTYPE tag;
-    DWORD offset;
-    DWORD pcb;
+    DWORD offset, pcb;
     bool withBuffer;
     BOOL result;
-    DWORD error;
-    DWORD pcbAfter;
+    DWORD error, pcbAfter;
     std::uint32_t firstFileByte;  // where the copied bytes come from
     BOOL reference;
   } cases[] = {
@@ -55,10 +73,8 @@ TEST(GetColorProfileElement, Boundaries) {
     std::memset(buffer, 0xEE, sizeof buffer);
     DWORD pcb = c.pcb;
     BOOL reference = kUntouched;
-    SetLastError(kSentinel);
-    EXPECT_EQ(GetColorProfileElement(h, c.tag, c.offset, &pcb, c.withBuffer ? buffer : nullptr, &reference),
-              c.result);
-    EXPECT_EQ(GetLastError(), c.error);
+    EXPECT_WIN32(GetColorProfileElement(h, c.tag, c.offset, &pcb, c.withBuffer ? buffer : nullptr, &reference),
+                 c.result, c.error);
     EXPECT_EQ(pcb, c.pcbAfter);
     EXPECT_EQ(reference, c.reference);
     const std::size_t copied = c.result ? c.pcbAfter : 0;
@@ -73,105 +89,71 @@ TEST(GetColorProfileElement, Boundaries) {
 }
 
 TEST(ColorProfileTags, IndexAndPresence) {
-  HPROFILE h = OpenMemory(SampleProfile(), PROFILE_READ);
+  HPROFILE h = OpenMemory(kSample, PROFILE_READ);
   EXPECT_WIN32(GetCountColorProfileElements(h, nullptr), FALSE, ERROR_INVALID_PARAMETER);
+  EXPECT_WIN32(GetColorProfileElementTag(h, 1, nullptr), FALSE, ERROR_INVALID_PARAMETER);
   for (DWORD bad : {0u, 4u, 0xFFFFFFFFu}) {
     TAGTYPE tag = 0x1234;
     EXPECT_WIN32(GetColorProfileElementTag(h, bad, &tag), FALSE, ERROR_INVALID_PARAMETER);
     EXPECT_EQ(tag, 0x1234u) << "left untouched";
   }
-  EXPECT_WIN32(GetColorProfileElementTag(h, 1, nullptr), FALSE, ERROR_INVALID_PARAMETER);
-  TAGTYPE last = 0;
-  EXPECT_TRUE(GetColorProfileElementTag(h, 3, &last));
-  EXPECT_EQ(last, Sig("gTRC"));
-  struct {
-    TAGTYPE tag;
-    BOOL present;
-  } presence[] = {{Sig("wtpt"), TRUE}, {Sig("gTRC"), TRUE}, {Sig("cprt"), FALSE}, {0, FALSE}};
-  for (const auto& p : presence) {
-    BOOL present = 7;
-    EXPECT_WIN32(IsColorProfileTagPresent(h, p.tag, &present), TRUE, ERROR_SUCCESS);
-    EXPECT_EQ(present, p.present) << std::hex << p.tag;
+  EXPECT_EQ(TagList(h), (std::vector<TAGTYPE>{Sig("wtpt"), Sig("rTRC"), Sig("gTRC")}));
+  for (auto [tag, present] : {std::pair{Sig("wtpt"), TRUE}, {Sig("gTRC"), TRUE}, {Sig("cprt"), FALSE}, {0u, FALSE}}) {
+    BOOL answer = 7;
+    EXPECT_WIN32(IsColorProfileTagPresent(h, tag, &answer), TRUE, ERROR_SUCCESS);
+    EXPECT_EQ(answer, present) << std::hex << tag;
   }
   EXPECT_WIN32(IsColorProfileTagPresent(h, Sig("wtpt"), nullptr), FALSE, ERROR_INVALID_PARAMETER);
   EXPECT_TRUE(CloseColorProfile(h));
 }
 
 TEST(SetColorProfileElement, WritesInsideTheElementOnly) {
-  HPROFILE h = OpenMemory(SampleProfile());
+  HPROFILE h = OpenMemory(kSample);
   std::uint8_t data[64];
   for (int i = 0; i < 64; ++i) data[i] = static_cast<std::uint8_t>(0x80 + i);
-  struct Case {
-    const char* what;
-    TAGTYPE tag;
-    DWORD offset, pcb;
-    BOOL result;
-    DWORD error, pcbAfter;
-  } cases[] = {
-      {"inside", Sig("wtpt"), 2, 4, TRUE, ERROR_SUCCESS, 4},
-      {"clipped at the end", Sig("wtpt"), 12, 64, TRUE, ERROR_SUCCESS, 8},
-      {"offset = size", Sig("wtpt"), 20, 64, TRUE, ERROR_SUCCESS, 0},
-      {"offset > size", Sig("wtpt"), 21, 4, FALSE, ERROR_INVALID_PARAMETER, 4},
-      {"absent tag", Sig("cprt"), 0, 4, FALSE, ERROR_TAG_NOT_FOUND, 4},
+  // what, tag, offset, *pcbElement before and after, result, error
+  const std::tuple<const char*, TAGTYPE, DWORD, DWORD, DWORD, BOOL, DWORD> cases[] = {
+      {"inside", Sig("wtpt"), 2, 4, 4, TRUE, ERROR_SUCCESS},
+      {"clipped at the end", Sig("wtpt"), 12, 64, 8, TRUE, ERROR_SUCCESS},
+      {"offset = size", Sig("wtpt"), 20, 64, 0, TRUE, ERROR_SUCCESS},
+      {"offset > size", Sig("wtpt"), 21, 4, 4, FALSE, ERROR_INVALID_PARAMETER},
+      {"absent tag", Sig("cprt"), 0, 4, 4, FALSE, ERROR_TAG_NOT_FOUND},
   };
-  for (const Case& c : cases) {
-    SCOPED_TRACE(c.what);
-    DWORD pcb = c.pcb;
-    EXPECT_WIN32(SetColorProfileElement(h, c.tag, c.offset, &pcb, data), c.result, c.error);
-    EXPECT_EQ(pcb, c.pcbAfter);
+  for (auto [what, tag, offset, pcb, pcbAfter, result, error] : cases) {
+    SCOPED_TRACE(what);
+    EXPECT_WIN32(SetColorProfileElement(h, tag, offset, &pcb, data), result, error);
+    EXPECT_EQ(pcb, pcbAfter);
   }
   // wtpt: bytes 0-1 original, 2-5 = data[0..3], 6-11 original, 12-19 = data[0..7].
   Bytes expected = FileBytes(168, 20);
   std::memcpy(&expected[2], data, 4);
   std::memcpy(&expected[12], data, 8);
-  Bytes got(64);
-  DWORD pcb = 64;
-  ASSERT_TRUE(GetColorProfileElement(h, Sig("wtpt"), 0, &pcb, got.data(), nullptr));
-  got.resize(pcb);
-  EXPECT_EQ(got, expected);
+  EXPECT_EQ(Element(h, Sig("wtpt")), expected);
   DWORD four = 4;
   EXPECT_WIN32(SetColorProfileElement(h, Sig("wtpt"), 0, nullptr, data), FALSE, ERROR_INVALID_PARAMETER);
   EXPECT_WIN32(SetColorProfileElement(h, Sig("wtpt"), 0, &four, nullptr), FALSE, ERROR_INVALID_PARAMETER);
   EXPECT_TRUE(CloseColorProfile(h));
 }
 
-DWORD ElementSize(HPROFILE h, TAGTYPE tag) {
-  DWORD size = 0;
-  GetColorProfileElement(h, tag, 0, &size, nullptr, nullptr);
-  return size;
-}
-
-Bytes Element(HPROFILE h, TAGTYPE tag) {
-  Bytes b(ElementSize(h, tag));
-  DWORD n = static_cast<DWORD>(b.size());
-  EXPECT_TRUE(GetColorProfileElement(h, tag, 0, &n, b.data(), nullptr));
-  return b;
-}
-
 TEST(ElementWrites, ReadOnlyHandlesRefuseEveryChange) {
-  HPROFILE h = OpenMemory(SampleProfile(), PROFILE_READ);
-  std::uint8_t data[4] = {1, 2, 3, 4};
-  DWORD pcb = 4;
-  EXPECT_WIN32(SetColorProfileElement(h, Sig("wtpt"), 0, &pcb, data), FALSE, ERROR_ACCESS_DENIED);
+  HPROFILE h = OpenMemory(kSample, PROFILE_READ);
+  EXPECT_WIN32(Write(h, Sig("wtpt"), 0, {1, 2, 3, 4}), FALSE, ERROR_ACCESS_DENIED);
   for (TAGTYPE tag : {Sig("wtpt"), Sig("cprt")})
     for (DWORD size : {0u, 8u, 40u}) EXPECT_WIN32(SetColorProfileElementSize(h, tag, size), FALSE, ERROR_ACCESS_DENIED);
+  EXPECT_WIN32(SetColorProfileElementReference(h, Sig("bTRC"), Sig("rTRC")), FALSE, ERROR_ACCESS_DENIED);
   EXPECT_EQ(Element(h, Sig("wtpt")), FileBytes(168, 20));
+  EXPECT_EQ(TagList(h), (std::vector<TAGTYPE>{Sig("wtpt"), Sig("rTRC"), Sig("gTRC")}));
   EXPECT_TRUE(CloseColorProfile(h));
 }
 
 TEST(SetColorProfileElementSize, GrowShrinkRemoveCreate) {
-  HPROFILE h = OpenMemory(SampleProfile());
+  HPROFILE h = OpenMemory(kSample);
   EXPECT_WIN32(SetColorProfileElementSize(h, Sig("wtpt"), 30), TRUE, ERROR_SUCCESS);
-  Bytes grown = FileBytes(168, 20);
-  grown.resize(30, 0);
-  EXPECT_EQ(Element(h, Sig("wtpt")), grown);
+  EXPECT_EQ(Element(h, Sig("wtpt")), FileBytes(168, 20, 30));
   ASSERT_TRUE(SetColorProfileElementSize(h, Sig("wtpt"), 8));
   EXPECT_EQ(Element(h, Sig("wtpt")), FileBytes(168, 8));
   EXPECT_WIN32(SetColorProfileElementSize(h, Sig("wtpt"), 0), TRUE, ERROR_SUCCESS);
   EXPECT_EQ(TagList(h), (std::vector<TAGTYPE>{Sig("rTRC"), Sig("gTRC")}));
-  BOOL present = TRUE;
-  ASSERT_TRUE(IsColorProfileTagPresent(h, Sig("wtpt"), &present));
-  EXPECT_FALSE(present);
   EXPECT_WIN32(SetColorProfileElementSize(h, Sig("wtpt"), 0), FALSE, ERROR_TAG_NOT_FOUND);
   EXPECT_WIN32(SetColorProfileElementSize(h, 0, 8), FALSE, ERROR_INVALID_PARAMETER);
   // Create, then fill: a new element is zero-filled and goes to the end of the table.
@@ -179,8 +161,7 @@ TEST(SetColorProfileElementSize, GrowShrinkRemoveCreate) {
   EXPECT_EQ(Element(h, Sig("cprt")), Bytes(12, 0));
   EXPECT_EQ(TagList(h), (std::vector<TAGTYPE>{Sig("rTRC"), Sig("gTRC"), Sig("cprt")}));
   const Bytes text = {'t', 'e', 'x', 't', 0, 0, 0, 0, 'a', 'b', 'c', 0};
-  DWORD n = 12;
-  ASSERT_TRUE(SetColorProfileElement(h, Sig("cprt"), 0, &n, const_cast<std::uint8_t*>(text.data())));
+  ASSERT_TRUE(Write(h, Sig("cprt"), 0, text));
   EXPECT_EQ(Element(h, Sig("cprt")), text);
   EXPECT_TRUE(CloseColorProfile(h));
 }
@@ -188,25 +169,14 @@ TEST(SetColorProfileElementSize, GrowShrinkRemoveCreate) {
 TEST(SharedElements, ResizeOrRewriteGivesAnOwnCopy) {
   for (bool resize : {true, false}) {
     SCOPED_TRACE(resize ? "resize" : "rewrite");
-    HPROFILE h = OpenMemory(SampleProfile());
-    if (resize) {
-      ASSERT_TRUE(SetColorProfileElementSize(h, Sig("gTRC"), 18));
-    } else {
-      std::uint8_t zero[2] = {0, 0};
-      DWORD n = 2;
-      ASSERT_TRUE(SetColorProfileElement(h, Sig("gTRC"), 0, &n, zero));
-    }
+    HPROFILE h = OpenMemory(kSample);
+    ASSERT_TRUE(resize ? SetColorProfileElementSize(h, Sig("gTRC"), 18) : Write(h, Sig("gTRC"), 0, {0, 0}));
     EXPECT_EQ(Element(h, Sig("rTRC")), FileBytes(188, 14)) << "the sibling stays intact";
-    Bytes changed = FileBytes(188, 14);
-    if (resize) changed.resize(18, 0); else changed[0] = changed[1] = 0;
+    Bytes changed = FileBytes(188, 14, resize ? 18 : 14);
+    if (!resize) changed[0] = changed[1] = 0;
     EXPECT_EQ(Element(h, Sig("gTRC")), changed);
-    for (TAGTYPE tag : {Sig("rTRC"), Sig("gTRC")}) {
-      BOOL reference = TRUE;
-      DWORD n = 1;
-      std::uint8_t b;
-      ASSERT_TRUE(GetColorProfileElement(h, tag, 0, &n, &b, &reference));
-      EXPECT_FALSE(reference);
-    }
+    EXPECT_EQ(Shared(h, Sig("rTRC")), FALSE);
+    EXPECT_EQ(Shared(h, Sig("gTRC")), FALSE);
     EXPECT_TRUE(CloseColorProfile(h));
   }
 }
@@ -237,52 +207,28 @@ TEST(SerializeProfile, LaysOutAlignedSharedData) {
   EXPECT_EQ(table[1].offset, table[2].offset) << "shared data stays shared";
   EXPECT_EQ(TagBytes(saved, table[0]), FileBytes(181, 19));
   EXPECT_EQ(TagBytes(saved, table[1]), FileBytes(200, 13));
-  Bytes desc = FileBytes(213, 5);
-  desc.resize(7, 0);
-  EXPECT_EQ(TagBytes(saved, table[3]), desc);
+  EXPECT_EQ(TagBytes(saved, table[3]), FileBytes(213, 5, 7));
   EXPECT_EQ(saved[table[0].offset + 19], 0);  // zero padding
 }
 
-}  // namespace
-
-namespace {
-
-using namespace icctest;
-
 TEST(SetColorProfileElementReference, ParameterChecksThenSharing) {
-  HPROFILE readOnly = OpenMemory(SampleProfile(), PROFILE_READ);
-  EXPECT_WIN32(SetColorProfileElementReference(readOnly, Sig("bTRC"), Sig("rTRC")), FALSE, ERROR_ACCESS_DENIED);
-  EXPECT_TRUE(CloseColorProfile(readOnly));
-
-  HPROFILE h = OpenMemory(SampleProfile());
-  const struct {
-    const char* what;
-    HPROFILE handle;
-    TAGTYPE newTag, refTag;
-    DWORD error;
-  } refused[] = {
-      {"no handle", nullptr, Sig("bTRC"), Sig("rTRC"), ERROR_INVALID_HANDLE},
-      {"tag 0", h, 0, Sig("rTRC"), ERROR_INVALID_PARAMETER},
-      {"absent reference", h, Sig("bTRC"), Sig("cprt"), ERROR_TAG_NOT_FOUND},
-      {"new tag exists", h, Sig("gTRC"), Sig("wtpt"), ERROR_DUPLICATE_TAG},
-      {"itself", h, Sig("wtpt"), Sig("wtpt"), ERROR_DUPLICATE_TAG},
+  HPROFILE h = OpenMemory(kSample);
+  const std::tuple<HPROFILE, TAGTYPE, TAGTYPE, DWORD> refused[] = {
+      {nullptr, Sig("bTRC"), Sig("rTRC"), ERROR_INVALID_HANDLE},
+      {h, 0, Sig("rTRC"), ERROR_INVALID_PARAMETER},
+      {h, Sig("bTRC"), Sig("cprt"), ERROR_TAG_NOT_FOUND},    // absent reference
+      {h, Sig("gTRC"), Sig("wtpt"), ERROR_DUPLICATE_TAG},    // the new tag exists
+      {h, Sig("wtpt"), Sig("wtpt"), ERROR_DUPLICATE_TAG},  // itself
   };
-  for (const auto& c : refused) {
-    SCOPED_TRACE(c.what);
-    EXPECT_WIN32(SetColorProfileElementReference(c.handle, c.newTag, c.refTag), FALSE, c.error);
-  }
+  for (auto [handle, newTag, refTag, error] : refused)
+    EXPECT_WIN32(SetColorProfileElementReference(handle, newTag, refTag), FALSE, error);
   EXPECT_EQ(TagList(h), (std::vector<TAGTYPE>{Sig("wtpt"), Sig("rTRC"), Sig("gTRC")})) << "nothing added";
 
   EXPECT_WIN32(SetColorProfileElementReference(h, Sig("bXYZ"), Sig("wtpt")), TRUE, ERROR_SUCCESS);
   EXPECT_EQ(TagList(h), (std::vector<TAGTYPE>{Sig("wtpt"), Sig("rTRC"), Sig("gTRC"), Sig("bXYZ")}));
   EXPECT_EQ(Element(h, Sig("bXYZ")), FileBytes(168, 20));
-  for (TAGTYPE tag : {Sig("wtpt"), Sig("bXYZ")}) {
-    BOOL reference = FALSE;
-    DWORD n = 1;
-    std::uint8_t b;
-    ASSERT_TRUE(GetColorProfileElement(h, tag, 0, &n, &b, &reference));
-    EXPECT_TRUE(reference);
-  }
+  EXPECT_EQ(Shared(h, Sig("wtpt")), TRUE);
+  EXPECT_EQ(Shared(h, Sig("bXYZ")), TRUE);
   // A reference to a reference joins the same data; the saved file holds it once.
   ASSERT_TRUE(SetColorProfileElementReference(h, Sig("bTRC"), Sig("gTRC")));
   std::vector<std::uint8_t> saved;
@@ -299,9 +245,7 @@ TEST(SetColorProfileElementReference, ParameterChecksThenSharing) {
   // leaves its sibling intact.
   ASSERT_TRUE(SetColorProfileElementSize(h, Sig("wtpt"), 0));
   EXPECT_EQ(Element(h, Sig("bXYZ")), FileBytes(168, 20));
-  std::uint8_t zero[2] = {0, 0};
-  DWORD two = 2;
-  ASSERT_TRUE(SetColorProfileElement(h, Sig("bTRC"), 0, &two, zero));
+  ASSERT_TRUE(Write(h, Sig("bTRC"), 0, {0, 0}));
   EXPECT_EQ(Element(h, Sig("gTRC")), FileBytes(188, 14));
   EXPECT_TRUE(CloseColorProfile(h));
 }

@@ -93,20 +93,29 @@ TEST_F(ProfileFileTest, ANameWithABackslashIsRefusedRatherThanMisread) {
 // Folders of programs that have ended are removed at start-up; a live program's stay.
 TEST_F(ProfileFileTest, StartUpSweepsTheFoldersOfEndedProgramsOnly) {
   const std::string temp = ProfileFiles::PluginTempFolder();
-  const std::string ended = temp + "900001/", live = temp + "900002/";
+  // Numbers of this run's own, far above any that programs claim.
+  const std::string base = temp + std::to_string(1000000 + 2 * getpid());
+  const std::string ended = base + "0/", live = base + "1/";
+  // Each is filled under a name the sweep ignores and then moved into place, and the live
+  // one is locked first, so that no program starting meanwhile takes either for its own.
+  int held = -1;
   for (const std::string& folder : {ended, live}) {
-    ASSERT_EQ(mkdir(folder.c_str(), 0777), 0);
-    ProfileFiles::Write(folder + "lock", {});
-    ProfileFiles::Write(folder + "0", {'x'});
-    ProfileFiles::Write(folder + "z", {'x'});
-    chmod((folder + "0").c_str(), 0444);
+    const std::string staging = folder.substr(0, folder.size() - 1) + ".new/";
+    ASSERT_EQ(mkdir(staging.c_str(), 0777), 0);
+    ProfileFiles::Write(staging + "lock", {});
+    ProfileFiles::Write(staging + "0", {'x'});
+    ProfileFiles::Write(staging + "z", {'x'});
+    chmod((staging + "0").c_str(), 0444);
+    if (folder == live) {
+      held = open((staging + "lock").c_str(), O_RDWR);
+      ASSERT_EQ(flock(held, LOCK_EX), 0);
+    }
+    ASSERT_EQ(rename(staging.c_str(), folder.c_str()), 0);
   }
   // This program's own lock admits nobody else, not even to share it.
   const int own = open((ProfileFiles::PluginWorkingFolder() + "lock").c_str(), O_RDONLY);
   EXPECT_NE(flock(own, LOCK_SH | LOCK_NB), 0);
   close(own);
-  const int held = open((live + "lock").c_str(), O_RDWR);
-  ASSERT_EQ(flock(held, LOCK_EX), 0);
   rt->CallGlobal("halvoUnregisterDebugger");
   rt.reset();
   rt = std::make_unique<host::Runtime>(TINTWELL_PLUGIN_PATH);

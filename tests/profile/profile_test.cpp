@@ -1,4 +1,7 @@
 // Profile objects on real files: working copies, saving, and the header properties.
+#include <fcntl.h>
+#include <stdio.h>
+
 #include <algorithm>
 #include <cstdio>
 #include <cstring>
@@ -54,15 +57,21 @@ TEST_F(ProfileTest, ASaveWhoseWriteFailsIsReportedAndLeavesTheFileAlone) {
   const std::string f = files.Copy("sRGB.icc", "a.icc");
   const auto original = ProfileFiles::Read(f);
   const std::string temp = ProfileFiles::PluginWorkingFolder();
-  const std::string moved = temp.substr(0, temp.size() - 1) + ".moved";
+  const std::string folder = temp.substr(0, temp.size() - 1), blocker = folder + ".blocker";
   Object p = Open(f);
   rt->Set(p, "Model", 42);
-  // Without its folder the working copy cannot be written back.
-  ASSERT_EQ(std::rename(temp.c_str(), moved.c_str()), 0);
+  // With a plain file in its folder's place the working copy cannot be written back. The
+  // two are exchanged in one step, so no program starting meanwhile finds the number free.
+  ProfileFiles::Write(blocker, {});
+  const auto exchange = [&] {
+    return renameat2(AT_FDCWD, folder.c_str(), AT_FDCWD, blocker.c_str(), RENAME_EXCHANGE);
+  };
+  ASSERT_EQ(exchange(), 0);
   Object d = Debugger();
   rt->Call(p, "SaveProfile");
   const int32_t code = Error();
-  ASSERT_EQ(std::rename(moved.c_str(), temp.c_str()), 0);
+  ASSERT_EQ(exchange(), 0);
+  std::remove(blocker.c_str());
   EXPECT_EQ(code, 3);  // ERROR_PATH_NOT_FOUND
   EXPECT_NE(std::find(log.entries.begin(), log.entries.end(), "DebugString:Error writing profile"), log.entries.end());
   EXPECT_EQ(std::find(log.entries.begin(), log.entries.end(), "DebugString:saveprofile"), log.entries.end());
