@@ -16,3 +16,6 @@ run convert srgb lab 255 255 255  255 0 0  0 128 255
 run convert srgb cmyk 255 255 255  255 0 0  40 40 40
 run --json convert lab srgb 50 20 -30
 run gamut cmyk 50 80 -80
+run tags srgb
+run tag srgb wtpt
+run tag srgb desc
