@@ -397,4 +397,25 @@ TEST_F(LutTest, AWrittenTableDrivesALittleCmsTransform) {
   cmsDeleteTransform(t), cmsCloseProfile(lab), cmsCloseProfile(cmyk);
 }
 
+// A table may be written whose sizes do not fit its counts; the layers below must refuse
+// it when it is used rather than read past it.
+TEST_F(LutTest, ATableThatDoesNotFitItsCountsIsRefusedWhereItIsUsed) {
+  const std::string path = files.Copy("ghostscript/default_cmyk.icc", "short.icc");
+  const std::string labPath = files.Copy("LCMSLABI.ICM", "lab.icc");
+  {
+    Object p = Open(path);
+    Object lut = NewLut(true, 4, 3, 33);  // 33^4 grid points claimed
+    Fill(lut, "InCurve", Doubles(8, 1000));
+    Fill(lut, "Lut", Doubles(10, 1000));
+    Fill(lut, "OutCurve", Doubles(6, 1000));
+    rt->Call(p, "SetMFT", {"A2B0", lut});
+    EXPECT_EQ(Error(), 0);
+    rt->Call(p, "SaveProfile");
+  }
+  Object p = Open(path), lab = Open(labPath);
+  EXPECT_FALSE(rt->Call(p, "ValidProfile").AsBoolean());
+  Object world = rt->New("ColorWorld", {p, lab});
+  EXPECT_NE(Error(), 0);
+}
+
 }  // namespace
