@@ -1,6 +1,7 @@
 #include "registration.h"
 
 #include "class_tables.h"
+#include "clut.h"
 #include "cmcolor.h"
 #include "colorworld.h"
 #include "debugger.h"
@@ -23,6 +24,7 @@ REALclassDefinition* const kClasses[] = {
     &CMColorClass,
     &ProfileClass,
     &ColorWorldClass,
+    &ClutClass,
 };
 
 // Global methods in registration order; a method joins this table once it is built.

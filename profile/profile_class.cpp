@@ -112,6 +112,8 @@ REALmethodDefinition methods[] = {
      "GetIndNamedColorPCS(index as Integer, byref Ll as double,byref La as double,byref Lb as double)"},
     {AsProc(&GetTRC), nullptr, "GetTRC(tag as String, v as Vector)"},
     {AsProc(&SetTRC), nullptr, "SetTRC(tag as String, v as Vector)"},
+    {AsProc(&GetMFT), nullptr, "GetMFT(tag as String) as Clut"},
+    {AsProc(&SetMFT), nullptr, "SetMFT(tag as String, mft as Clut)"},
     {AsProc(&GetNC), nullptr, "GetNC(tag as String, v as VectorNC)"},
     {AsProc(&SetNC), nullptr, "SetNC(tag as String, v as VectorNC)"},
     {AsProc(&GetTextTypeTag), nullptr, "GetTextTypeTag(tag as String) as String"},

@@ -31,6 +31,12 @@ int32_t HALVO_ICMReadTagText(HPROFILE profile, TAGTYPE tag, char* buffer);
 void HALVO_ICMWriteTagDesc(HPROFILE profile, TAGTYPE tag, const char* text);
 int32_t HALVO_ICMReadTagDesc(HPROFILE profile, TAGTYPE tag, char* buffer);
 
+// lut8Type and lut16Type, between a tag and a cLut: tags/lut_codec.cpp. The reader
+// refuses any other type and any tag whose tables do not fit inside it, leaving the cLut
+// as it was; it returns -1 on failure.
+void HALVO_ICMWriteTagClut(HPROFILE profile, TAGTYPE tag, REALobject clut);
+int32_t HALVO_ICMReadTagClut(HPROFILE profile, TAGTYPE tag, REALobject clut);
+
 // namedColor2Type: tags/named_color_codec.cpp
 void HALVO_ICMWriteTagNC(HPROFILE profile, TAGTYPE tag, REALobject vectorNC);
 int32_t HALVO_ICMReadTagNC(HPROFILE profile, TAGTYPE tag, REALobject vectorNC);
@@ -40,6 +46,8 @@ int32_t HALVO_ICMReadTagNC(HPROFILE profile, TAGTYPE tag, REALobject vectorNC);
 namespace tag_members {
 void GetTRC(REALobject self, REALstring tag, REALobject vector);
 void SetTRC(REALobject self, REALstring tag, REALobject vector);
+REALobject GetMFT(REALobject self, REALstring tag);
+void SetMFT(REALobject self, REALstring tag, REALobject clut);
 void GetNC(REALobject self, REALstring tag, REALobject vectorNC);
 void SetNC(REALobject self, REALstring tag, REALobject vectorNC);
 }  // namespace tag_members

@@ -12,8 +12,9 @@ namespace tool {
 
 // One change the edit command makes, in the order given.
 struct Edit {
-  enum Kind { Description, Copyright, Remove, CopyTag } kind;
-  std::string value;  // the text, the tag to remove, or NEW=EXISTING
+  enum Kind { Description, Copyright, Remove, CopyTag, LutFrom } kind;
+  std::string value;  // the text, the tag to remove, NEW=EXISTING, or the lut's JSON file
+  std::string tag;    // LutFrom: the tag to write
 };
 
 struct Options {

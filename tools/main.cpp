@@ -31,7 +31,9 @@ void PrintUsage(std::FILE* to) {
       "  tags PROFILE                 every tag: index, signature, type, offset and size in\n"
       "                               the file, and the tags whose data it shares\n"
       "  tag PROFILE SIG              one tag decoded: a curve's entries or gamma, an XYZ,\n"
-      "                               a text or description, a named-colour list\n"
+      "                               a text or description, a named-colour list, a lut's\n"
+      "                               channels, grid, matrix and table sizes (with --json,\n"
+      "                               every value: the file --lut-from takes)\n"
       "  edit PROFILE EDIT... [-o OUT]  change tags, then save the profile (to OUT if given)\n"
       "\n"
       "A PROFILE is a file, or one of the built-in profiles:\n",
@@ -60,6 +62,11 @@ void PrintUsage(std::FILE* to) {
       "  --copyright TEXT     the copyright ('cprt' tag)\n"
       "  --remove SIG         remove a tag (may be repeated)\n"
       "  --copy-tag NEW=SIG   make tag NEW share the data of tag SIG (may be repeated)\n"
+      "  --lut-from FILE SIG  write tag SIG as the lut (mft1 or mft2) in FILE, a JSON\n"
+      "                       object as 'tag --json' prints it: type, inputChannels,\n"
+      "                       outputChannels, gridPoints, matrix (9 numbers, row by row),\n"
+      "                       inCurve, lut and outCurve (whole numbers, 0-255 in mft1,\n"
+      "                       0-65535 in mft2)\n"
       "  -o OUT               save the edited profile as OUT; without it the profile's\n"
       "                       own file is replaced\n"
       "A tag signature of fewer than 4 characters is padded with spaces ('XYZ').\n"
@@ -111,10 +118,14 @@ int main(int argc, char** argv) {
       if (i + 1 >= argc) return Usage(arg + " needs a value");
       const std::string v = argv[++i];
       if (arg == "-o") options.output = v;
-      if (arg == "--desc") options.edits.push_back({tool::Edit::Description, v});
-      if (arg == "--copyright") options.edits.push_back({tool::Edit::Copyright, v});
-      if (arg == "--remove") options.edits.push_back({tool::Edit::Remove, v});
-      if (arg == "--copy-tag") options.edits.push_back({tool::Edit::CopyTag, v});
+      if (arg == "--desc") options.edits.push_back({tool::Edit::Description, v, ""});
+      if (arg == "--copyright") options.edits.push_back({tool::Edit::Copyright, v, ""});
+      if (arg == "--remove") options.edits.push_back({tool::Edit::Remove, v, ""});
+      if (arg == "--copy-tag") options.edits.push_back({tool::Edit::CopyTag, v, ""});
+    } else if (arg == "--lut-from") {
+      if (i + 2 >= argc) return Usage("--lut-from needs a JSON file and a tag signature");
+      options.edits.push_back({tool::Edit::LutFrom, argv[i + 1], argv[i + 2]});
+      i += 2;
     } else if (arg == "--verbose") {
       verbose = true;
     } else if (arg == "--plugin" || arg == "--via" || arg == "--intent") {
@@ -142,7 +153,7 @@ int main(int argc, char** argv) {
     return Usage("unknown command " + command);
   if (options.raw && command != "tag") return Usage("--raw belongs to the tag command");
   if ((!options.edits.empty() || !options.output.empty()) && command != "edit")
-    return Usage("--desc, --copyright, --remove, --copy-tag and -o belong to the edit command");
+    return Usage("--desc, --copyright, --remove, --copy-tag, --lut-from and -o belong to the edit command");
 
   std::unique_ptr<tool::Session> session;
   try {

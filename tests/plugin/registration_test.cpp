@@ -20,7 +20,7 @@ TEST_F(PluginTest, RegistersItsClassesAndGlobalsWithTheStoredDeclarations) {
   std::vector<std::string> names;
   for (const auto* c : classes) names.push_back(c->name);
   EXPECT_EQ(names, (std::vector<std::string>{"halvoDebugger", "Matrix", "Vector", "VectorNC", "CMColor", "Profile",
-                                             "ColorWorld"}));
+                                             "ColorWorld", "cLut"}));
   const host::ClassInfo& debugger = *classes[0];
   EXPECT_EQ(debugger.name, "halvoDebugger");
   EXPECT_EQ(debugger.dataSize, 1u);
@@ -68,6 +68,7 @@ TEST_F(PluginTest, RegistersItsClassesAndGlobalsWithTheStoredDeclarations) {
                 "GetNamedColorIndex(name as String) as Integer", "GetNamedColorName(index as Integer) as String",
                 "GetIndNamedColorPCS(index as Integer, byref Ll as double,byref La as double,byref Lb as double)",
                 "GetTRC(tag as String, v as Vector)", "SetTRC(tag as String, v as Vector)",
+                "GetMFT(tag as String) as Clut", "SetMFT(tag as String, mft as Clut)",
                 "GetNC(tag as String, v as VectorNC)", "SetNC(tag as String, v as VectorNC)",
                 "GetTextTypeTag(tag as String) as String", "SetTextTypeTag(tag as String, data as String)",
                 "GetDescTypeTag(tag as String) as String", "SetDescTypeTag(tag as String, data as String)"}));

@@ -123,7 +123,9 @@ class SweepTest : public PluginTest {
     } catch (const host::HostError& e) {
       ADD_FAILURE() << member << ": " << e.what();
     }
-    EXPECT_EQ(rt->LiveObjects(), objects) << member << " left objects alive";
+    // Fewer is allowed: a setter gives up the object its property held. A release too
+    // many shows as a host fault, and the scope's end must come back to none.
+    EXPECT_LE(rt->LiveObjects(), objects) << member << " left objects alive";
     EXPECT_EQ(rt->LiveStrings(), strings) << member << " left strings alive";
     EXPECT_EQ(rt->Faults().size(), faults) << member << ": " << rt->Faults().back();
     for (const std::string& name : PluginFiles()) EXPECT_TRUE(before.count(name)) << member << " left " << name;

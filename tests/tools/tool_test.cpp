@@ -1,8 +1,10 @@
 // The command-line tool as a user runs it: output, exit status and messages.
 #include <gtest/gtest.h>
+#include <lcms2.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <cstdint>
 #include <cstdio>
 #include <cstdlib>
 #include <fstream>
@@ -253,6 +255,140 @@ TEST(Tool, TagCommandsRefuseBadRequests) {
     EXPECT_TRUE(Has(r.err, c.said)) << c.args << ": " << r.err;
   }
   EXPECT_EQ(Slurp(copy), original) << "a failed edit saves nothing";
+}
+
+}  // namespace
+
+namespace {
+
+std::string Replaced(std::string text, const std::string& from, const std::string& to) {
+  const std::size_t at = text.find(from);
+  EXPECT_NE(at, std::string::npos) << from;
+  if (at != std::string::npos) text.replace(at, from.size(), to);
+  return text;
+}
+
+std::string WriteFile(const std::string& name, const std::string& text) {
+  const std::string path = ::testing::TempDir() + "tw_" + std::to_string(getpid()) + "_" + name;
+  std::ofstream(path, std::ios::binary) << text;
+  return path;
+}
+
+// The tag's bytes as Little CMS reads them from the saved file.
+std::vector<std::uint8_t> RawTag(const std::string& profile, const char* sig) {
+  cmsHPROFILE h = cmsOpenProfileFromFile(profile.c_str(), "r");
+  if (h == nullptr) return {};
+  const cmsTagSignature tag = static_cast<cmsTagSignature>(
+      static_cast<std::uint32_t>(sig[0]) << 24 | static_cast<std::uint32_t>(sig[1]) << 16 |
+      static_cast<std::uint32_t>(sig[2]) << 8 | static_cast<std::uint32_t>(sig[3]));
+  std::vector<std::uint8_t> bytes(cmsReadRawTag(h, tag, nullptr, 0));
+  if (!bytes.empty()) cmsReadRawTag(h, tag, bytes.data(), static_cast<cmsUInt32Number>(bytes.size()));
+  cmsCloseProfile(h);
+  return bytes;
+}
+
+std::string Values(std::size_t n, int value) {
+  std::string out;
+  for (std::size_t i = 0; i < n; ++i) out += (i ? ", " : "") + std::to_string(value + static_cast<int>(i % 200));
+  return out;
+}
+
+// Every number of a lut dump from its matrix on: the values, whatever their spelling.
+std::vector<double> LutNumbers(const std::string& json) {
+  std::vector<double> values;
+  const char* p = json.c_str() + json.find("\"matrix\"");
+  while (*p) {
+    if (*p == '-' || (*p >= '0' && *p <= '9')) values.push_back(std::strtod(p, const_cast<char**>(&p)));
+    else ++p;
+  }
+  return values;
+}
+
+// A lut dumped with --json, edited, written back with --lut-from and dumped again: the
+// new dump holds the edited values, and the saved bytes hold them where the tag layout
+// puts them.
+TEST(Tool, DumpsEditsAndWritesBackLuts) {
+  Result r = RunTool("tag cmyk A2B0");
+  ASSERT_EQ(r.status, 0) << r.err;
+  EXPECT_EQ(r.out.substr(0, r.out.find('\n')), "lut16 ('mft2'): 4 inputs, 3 outputs, 9 grid points");
+  EXPECT_TRUE(Has(r.out, "clut           19683 entries (9^4 grid points x 3)")) << r.out;
+  r = RunTool("--json tag cmyk A2B0");
+  ASSERT_EQ(r.status, 0) << r.err;
+  std::string lut16 = Replaced(r.out, "\"matrix\": [1, 0,", "\"matrix\": [1, -1.5,");
+  // The first three CLUT entries replaced, spelt as a hand edit might spell them.
+  const std::size_t first = lut16.find("\"lut\": [") + 8;
+  std::size_t fourth = first;
+  for (int k = 0; k < 3; ++k) fourth = lut16.find(", ", fourth) + 2;
+  lut16.replace(first, fourth - first, "65535, 0.0e0, 12e2, ");
+  const std::string mft1 =
+      "{\"type\": \"mft1\", \"inputChannels\": 3, \"outputChannels\": 3, \"gridPoints\": 2,\n"
+      " \"matrix\": [1, 0, 0, 0.0000152587890625, 0.25, 0, 0, 0, -3.5], \"inCurve\": [" + Values(768, 0) + "],\n"
+      " \"lut\": [" + Values(24, 55) + "], \"outCurve\": [" + Values(768, 50) + "]}";
+  const struct {
+    std::string json;
+    std::size_t size;  // the tag's bytes, as Little CMS reads them
+    std::vector<std::pair<std::size_t, std::vector<std::uint8_t>>> bytes;  // edited values where they sit
+  } cases[] = {
+      // Header 52 bytes, input tables 4 x 256 entries of 2 bytes: the CLUT starts at 2100.
+      {lut16, 52 + 2 * (1024 + 19683 + 6), {{16, {0xFF, 0xFE, 0x80, 0x00}}, {2100, {0xFF, 0xFF, 0, 0, 0x04, 0xB0}}}},
+      {mft1, 1608, {{24, {0, 0, 0, 1}}, {28, {0, 0, 0x40, 0}}, {44, {0xFF, 0xFC, 0x80, 0}}, {48 + 768, {55, 56, 57}}, {1607, {217}}}},
+  };
+  const std::string copy = CopyProfile(TINTWELL_ICC_DIR "/ghostscript/default_cmyk.icc", "lut.icc");
+  const std::string out = ::testing::TempDir() + "tw_" + std::to_string(getpid()) + "_lut_out.icc";
+  for (const auto& c : cases) {
+    const std::string file = WriteFile("lut.json", c.json);
+    r = RunTool("edit " + copy + " --lut-from " + file + " A2B1 -o " + out);
+    ASSERT_EQ(r.status, 0) << r.err;
+    const std::vector<std::uint8_t> raw = RawTag(out, "A2B1");
+    ASSERT_EQ(raw.size(), c.size);
+    for (const auto& [at, bytes] : c.bytes)
+      EXPECT_EQ(std::vector<std::uint8_t>(raw.begin() + static_cast<long>(at),
+                                          raw.begin() + static_cast<long>(at + bytes.size())), bytes) << "at " << at;
+    r = RunTool("--json tag " + out + " A2B1");
+    ASSERT_EQ(r.status, 0) << r.err;
+    EXPECT_TRUE(LutNumbers(r.out) == LutNumbers(c.json)) << "the values read back as written";
+  }
+}
+
+TEST(Tool, RefusesMalformedLutFiles) {
+  const std::string dump = RunTool("--json tag cmyk A2B0").out;
+  ASSERT_TRUE(Has(dump, "\"type\": \"mft2\""));
+  const std::string copy = CopyProfile(TINTWELL_ICC_DIR "/ghostscript/default_cmyk.icc", "badlut.icc");
+  const std::string original = Slurp(copy);
+  const struct {
+    std::string json, said;
+  } cases[] = {
+      {dump.substr(0, dump.size() / 2), "not valid JSON: line "},
+      {dump + "x", "text after the value"},
+      {"", "unexpected end of text"},
+      {std::string(100000, '['), "nested deeper than"},
+      {"{\"a\": 1, \"a\": 2}", "a key repeated"},
+      {"{\"type\": 0x10}", "expected '}'"},
+      {"[1e999]", "a number too large"},
+      {"[\"\\q\"]", "unknown escape"},
+      {"[1, 2]", "a lut is a JSON object"},
+      {Replaced(dump, "\"type\": \"mft2\"", "\"type\": \"mft3\""), "\"type\" is \"mft1\" or \"mft2\""},
+      {Replaced(dump, "\"type\": \"mft2\"", "\"type\": \"mft1\""), "\"inCurve\"[1] is 548, not a whole number from 0 to 255"},
+      {Replaced(dump, "\"gridPoints\": 9", "\"gridPoints\": 8"), "\"lut\" holds 19683 values, not 8^4 grid points x 3"},
+      {Replaced(dump, "\"inputChannels\": 4", "\"inputChannels\": 16"), "\"inputChannels\" is a whole number from 1 to 15"},
+      {Replaced(dump, "\"inCurve\": [0,", "\"inCurve\": ["), "\"inCurve\" holds 1023 values; 4 channels need"},
+      {Replaced(dump, "\"outCurve\": [0,", "\"outCurve\": [0.5,"), "\"outCurve\"[0] is 0.5"},
+      {Replaced(dump, "\"outCurve\": [0,", "\"outCurve\": [65536,"), "\"outCurve\"[0] is 65536"},
+      {Replaced(dump, "\"outCurve\": [0,", "\"outCurve\": [\"0\","), "\"outCurve\"[0] is not a number"},
+      {Replaced(dump, "\"matrix\": [1,", "\"matrix\": ["), "\"matrix\" holds 9 numbers"},
+      {Replaced(dump, "\"matrix\": [1,", "\"matrix\": [40000,"), "\"matrix\"[0] is 40000"},
+      {Replaced(dump, "\"tag\"", "\"tog\""), "unknown key \"tog\""},
+      {Replaced(dump, "\"lut\"", "\"tag2\""), "unknown key"},
+  };
+  for (const auto& c : cases) {
+    const std::string file = WriteFile("bad.json", c.json);
+    const Result r = RunTool("edit " + copy + " --desc first --lut-from " + file + " A2B0");
+    EXPECT_EQ(r.status, 2) << c.said;
+    EXPECT_TRUE(Has(r.err, c.said)) << c.said << ": " << r.err;
+  }
+  EXPECT_EQ(RunTool("edit " + copy + " --lut-from /nonexistent.json A2B0").status, 2);
+  EXPECT_EQ(RunTool("edit " + copy + " --lut-from x.json").status, 2);
+  EXPECT_EQ(Slurp(copy), original) << "a refused lut file saves nothing, not even the edits before it";
 }
 
 }  // namespace

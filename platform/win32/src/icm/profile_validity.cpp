@@ -16,10 +16,34 @@ constexpr std::uint32_t kMatrixShaperTags[] = {
 };
 constexpr std::size_t kMinTagSize = 12;
 
+constexpr std::uint32_t kLut8 = 0x6D667431;   // 'mft1'
+constexpr std::uint32_t kLut16 = 0x6D667432;  // 'mft2'
+
+// A lut8 or lut16 table must hold the tables its channel counts and grid size claim;
+// one written short would otherwise be taken for a usable transform. Sizes in 64 bits,
+// the grid capped as soon as it passes what any element can hold.
+bool LutFits(const Block& block) {
+  const std::uint8_t* data = block.data();
+  const std::uint32_t type = ReadBE32(data);
+  if (type != kLut8 && type != kLut16) return true;  // other types are judged by the engine
+  if (block.size() < 52) return false;
+  const std::uint64_t in = data[8], out = data[9], grid = data[10];
+  std::uint64_t cells = 1;
+  for (std::uint64_t k = 0; k < in && cells <= block.size(); ++k) cells *= grid;
+  if (type == kLut8) return 48 + 256 * in + cells * out + 256 * out <= block.size();
+  const std::uint64_t inEntries = std::uint64_t{data[48]} << 8 | data[49];
+  const std::uint64_t outEntries = std::uint64_t{data[50]} << 8 | data[51];
+  return 52 + 2 * (inEntries * in + cells * out + outEntries * out) <= block.size();
+}
+
 bool Usable(const IccContainer& profile, std::uint32_t signature) {
   const Block* block = profile.Element(signature);
   return block != nullptr && block->size() >= kMinTagSize && ReadBE32(block->data()) != 0;
 }
+
+// The tags that hold lookup tables: A2B0-2, B2A0-2, gamt, pre0-2.
+constexpr std::uint32_t kLutTags[] = {0x41324230, 0x41324231, 0x41324232, 0x42324130, 0x42324131,
+                                      0x42324132, 0x67616D74, 0x70726530, 0x70726531, 0x70726532};
 
 }  // namespace
 
@@ -29,6 +53,10 @@ bool IsUsableProfile(const IccContainer& profile) {
   const std::uint8_t major = header[kOffsetVersion];
   if (major < 2 || major > 4) return false;
   if (ReadBE32(header + kOffsetSize) != profile.ByteSize()) return false;
+  for (std::uint32_t signature : kLutTags) {
+    const Block* block = profile.Element(signature);
+    if (block != nullptr && block->size() >= 4 && !LutFits(*block)) return false;
+  }
 
   switch (ReadBE32(header + kOffsetClass)) {
     case CLASS_LINK:
