@@ -289,7 +289,13 @@ TEST_F(LutTest, TagsThatLieAreRefusedAndLeaveTheNewValues) {
 
   ProfileFiles::Write(path, good);
   Object p = Open(path);
+  // Shorter than the header of a lut16.
+  EXPECT_EQ(rt->Call(p, "SetTagData", {"pre0", std::string("mft2") + std::string(40, '\0')}).AsInteger(), 1);
   Object d = Debugger();
+  rt->Call(p, "GetMFT", {"pre0"});
+  EXPECT_EQ(Error(), 2011);
+  EXPECT_TRUE(Traced("Lut tag is too short"));
+  log.entries.clear();
   Object lut = rt->Call(p, "GetMFT", {"gamt"}).AsObject();
   EXPECT_EQ(log.entries, std::vector<std::string>{"DebugString:Tag is not present"});
   EXPECT_EQ(Error(), 0);
@@ -306,6 +312,10 @@ TEST_F(LutTest, AWriteThatFailsIsReportedOnce) {
   EXPECT_EQ(Error(), 6);  // ERROR_INVALID_HANDLE
   EXPECT_EQ(std::count(log.entries.begin(), log.entries.end(), "DebugString:SetColorProfileElement1 fail"), 1);
   EXPECT_FALSE(Traced("SetColorProfileElement1 fai3"));
+  const std::vector<std::string> banner = {"DebugString:-------->", "DebugString:-------->", "DebugString:-------->",
+                                           "DebugString:--------> HALVO_ICMWriteTagClut", "DebugString:A2B0",
+                                           "DebugString:-------->"};
+  EXPECT_NE(std::search(log.entries.begin(), log.entries.end(), banner.begin(), banner.end()), log.entries.end());
 }
 
 // iccdump -v3 prints a lut16's tables scaled to 0..1: a row of the input or output tables
