@@ -10,40 +10,20 @@
 
 #include "clut.h"
 #include "icm.h"
+#include "tag_fuzz_support.h"
 #include "matrix.h"
 #include "tag_codecs.h"
 #include "vector.h"
 
 namespace {
 
+using tagfuzz::AsObject;
+using tagfuzz::BlankProfile;
+using tagfuzz::Check;
+using tagfuzz::OpenWithTag;
+
 constexpr TAGTYPE kTag = 0x41324230;   // 'A2B0'
 constexpr TAGTYPE kCopy = 0x41324231;  // 'A2B1'
-
-// Names the failed check's line before aborting, so a crash says which property broke.
-void Check(bool condition, int line = __builtin_LINE()) {
-  if (condition) return;
-  std::fprintf(stderr, "lut_fuzz.cpp:%d: check failed\n", line);
-  std::abort();
-}
-
-// A header that opens: its size, version 2.1, 'acsp', no tags.
-std::vector<std::uint8_t> BlankProfile() {
-  std::vector<std::uint8_t> b(132, 0);
-  b[3] = 132;
-  b[8] = 0x02, b[9] = 0x10;
-  std::memcpy(&b[12], "prtr", 4);
-  std::memcpy(&b[16], "CMYK", 4);
-  std::memcpy(&b[20], "Lab ", 4);
-  std::memcpy(&b[36], "acsp", 4);
-  return b;
-}
-
-// Before registration every class's instance offset is 0, so zeroed records stand in
-// for the cLut and the Vector and Matrix objects it holds.
-template <class Record>
-REALobject AsObject(Record* record) {
-  return reinterpret_cast<REALobject>(record);
-}
 
 // A cLut as its constructor leaves it, over records the caller owns.
 struct Lut {
@@ -74,14 +54,8 @@ bool SameTable(const VectorData& a, const VectorData& b) {
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
-  static std::vector<std::uint8_t> blank = BlankProfile();
-  PROFILE profile{PROFILE_MEMBUFFER, blank.data(), static_cast<DWORD>(blank.size())};
-  HPROFILE h = OpenColorProfileA(&profile, PROFILE_READWRITE, 0, OPEN_EXISTING);
-  Check(h != nullptr);
-  std::vector<std::uint8_t> tag(data, data + size);
-  DWORD n = static_cast<DWORD>(size);
-  Check(SetColorProfileElementSize(h, kTag, n) == (size > 0));
-  if (size > 0) Check(SetColorProfileElement(h, kTag, 0, &n, tag.data()) && n == size);
+  static std::vector<std::uint8_t> blank = BlankProfile("prtr", "CMYK", "Lab ");
+  HPROFILE h = OpenWithTag(blank, kTag, data, size);
 
   Lut first;
   if (HALVO_ICMReadTagClut(h, kTag, first.object()) == 0) {

@@ -9,28 +9,18 @@
 #include <vector>
 
 #include "icm.h"
+#include "tag_fuzz_support.h"
 #include "tag_codecs.h"
 #include "vector.h"
 
 namespace {
 
+using tagfuzz::AsObject;
+using tagfuzz::BlankProfile;
+using tagfuzz::Check;
+using tagfuzz::OpenWithTag;
+
 constexpr TAGTYPE kTag = 0x74657374;  // 'test'
-
-void Check(bool condition) {
-  if (!condition) std::abort();
-}
-
-// A header that opens: its size, version 2.1, 'acsp', no tags.
-std::vector<std::uint8_t> BlankProfile() {
-  std::vector<std::uint8_t> b(132, 0);
-  b[3] = 132;
-  b[8] = 0x02, b[9] = 0x10;
-  std::memcpy(&b[12], "mntr", 4);
-  std::memcpy(&b[16], "RGB ", 4);
-  std::memcpy(&b[20], "XYZ ", 4);
-  std::memcpy(&b[36], "acsp", 4);
-  return b;
-}
 
 void TwoCalls(int32_t (*reader)(HPROFILE, TAGTYPE, char*), HPROFILE h) {
   const int32_t size = reader(h, kTag, nullptr);
@@ -44,19 +34,11 @@ void TwoCalls(int32_t (*reader)(HPROFILE, TAGTYPE, char*), HPROFILE h) {
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
-  static std::vector<std::uint8_t> blank = BlankProfile();
-  PROFILE profile{PROFILE_MEMBUFFER, blank.data(), static_cast<DWORD>(blank.size())};
-  HPROFILE h = OpenColorProfileA(&profile, PROFILE_READWRITE, 0, OPEN_EXISTING);
-  Check(h != nullptr);
-  std::vector<std::uint8_t> tag(data, data + size);
-  DWORD n = static_cast<DWORD>(size);
-  Check(SetColorProfileElementSize(h, kTag, n) == (size > 0));
-  if (size > 0) Check(SetColorProfileElement(h, kTag, 0, &n, tag.data()) && n == size);
+  static std::vector<std::uint8_t> blank = BlankProfile("mntr", "RGB ", "XYZ ");
+  HPROFILE h = OpenWithTag(blank, kTag, data, size);
 
-  // Before registration the Vector class's instance offset is 0, so a zeroed record
-  // stands in for a Vector object.
   VectorData curve{};
-  const int32_t entries = HALVO_ICMReadTagCurve(h, kTag, reinterpret_cast<REALobject>(&curve));
+  const int32_t entries = HALVO_ICMReadTagCurve(h, kTag, AsObject(&curve));
   Check(curve.count == static_cast<uint32_t>(entries < 0 ? 0 : entries));
   // Never more entries than bytes came back.
   Check(entries < 0 || entries == 256 || static_cast<std::size_t>(entries) <= size / 2);
