@@ -5,7 +5,7 @@ set -euo pipefail
 packages=(
   build-essential cmake pkg-config
   clang libclang-rt-14-dev           # libFuzzer and the sanitizer runtimes
-  liblcms2-dev libffi-dev libpng-dev
+  liblcms2-dev libffi-dev libpng-dev libjpeg62-turbo-dev libtiff-dev
   libgtest-dev libgmock-dev googletest libbenchmark-dev
   icc-profiles-free colord-data libgs-common argyll
 )
