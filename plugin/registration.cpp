@@ -7,6 +7,7 @@
 #include "debugger.h"
 #include "error_state.h"
 #include "host_bridge.h"
+#include "image_profiles.h"
 #include "matrix.h"
 #include "profile.h"
 #include "vector.h"
@@ -33,6 +34,11 @@ REALmethodDefinition globalMethods[] = {
     {AsProc(&halvoUnregisterDebugger), nullptr, "halvoUnregisterDebugger()"},
     {AsProc(&CMError), nullptr, "CMError() as Integer"},
     {AsProc(&CMErrorMessage), nullptr, "CMErrorMessage() as string"},
+    {AsProc(&GetImageSpace), nullptr, "GetImageSpace(f as Folderitem) as String"},
+    {AsProc(&EmbedImage), nullptr,
+     "EmbedImage(fromf as folderitem, tof as folderitem, replace as boolean, p as Profile) as Boolean"},
+    {AsProc(&ImageProfileCount), nullptr, "ImageProfileCount(f as folderitem) as Integer"},
+    {AsProc(&GetImageProfile), nullptr, "GetImageProfile(f as folderitem, index as Integer) as Profile"},
     {AsProc(&NewConcatColorWorld), nullptr,
      "NewConcatColorWorld(keyindex as Integer, p1 as Profile, p2 as Profile, p3 as Profile, p4 as Profile) as "
      "ColorWorld"},

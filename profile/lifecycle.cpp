@@ -42,6 +42,13 @@ void UninstallCopy(ProfileData* d) {
   UninstallColorProfileA(nullptr, d->tempName, TRUE);
 }
 
+// Removes the own file when it is a temporary file that only this object knows.
+void DeleteOwnedFile(ProfileData* d) {
+  if (!d->ownsFile) return;
+  d->ownsFile = false;
+  DeleteFileA(d->path);
+}
+
 // Before a constructor runs again on an object: closes its profile and removes its
 // working copy, which nothing else can reach any more.
 void ReleasePrevious(ProfileData* d) {
@@ -51,6 +58,7 @@ void ReleasePrevious(ProfileData* d) {
   }
   if (d->tempPath[0]) DeleteFileA(d->tempPath);
   UninstallCopy(d);
+  DeleteOwnedFile(d);
   d->tempPath[0] = '\0';
   d->tempName[0] = '\0';
 }
@@ -244,6 +252,7 @@ void Destruct(REALobject self) {
     SetCMError(static_cast<int32_t>(code));
   }
   UninstallCopy(d);
+  DeleteOwnedFile(d);
 }
 
 REALfolderItem GetLocation(REALobject self, intptr_t) {

@@ -13,6 +13,7 @@ struct ProfileData {
   char tempPath[MAX_PATH];  // the working copy: the temporary folder and tempName
   char tempName[36];        // the working copy's file name, a decimal counter value
   bool installed;           // a copy named tempName was installed in the colour directory
+  bool ownsFile;            // path is a temporary file of the plugin's, deleted with the object
 };
 
 extern REALclassDefinition ProfileClass;

@@ -11,7 +11,7 @@
 set -euo pipefail
 cd "$(dirname "$0")/.."
 
-targets=(icc_container_fuzz tool_input_fuzz transform_fuzz bitmap_fuzz device_link_fuzz tag_codec_fuzz named_color_fuzz lut_fuzz)
+targets=(icc_container_fuzz tool_input_fuzz transform_fuzz bitmap_fuzz device_link_fuzz tag_codec_fuzz named_color_fuzz lut_fuzz image_profile_fuzz)
 build=${FUZZ_BUILD:-build-fuzz}
 seconds=300
 case "${1:-}" in

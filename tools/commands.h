@@ -23,7 +23,8 @@ struct Options {
   std::vector<std::string> via;   // up to two profiles between source and destination
   bool raw = false;               // tag: the bytes as a hex dump
   std::vector<Edit> edits;        // edit: the changes
-  std::string output;             // edit: save here instead of in place
+  std::string output;             // edit: save here instead of in place; embed, extract: the file made
+  bool replace = false;           // embed: replace a profile the image already carries
 };
 
 int ListCommand(Session& session, const std::vector<std::string>& args, const Options& options);
@@ -34,6 +35,9 @@ int GamutCommand(Session& session, const std::vector<std::string>& args, const O
 int TagsCommand(Session& session, const std::vector<std::string>& args, const Options& options);
 int TagCommand(Session& session, const std::vector<std::string>& args, const Options& options);
 int EditCommand(Session& session, const std::vector<std::string>& args, const Options& options);
+// Profiles in image files: tools/image_commands.cpp
+int EmbedCommand(Session& session, const std::vector<std::string>& args, const Options& options);
+int ExtractCommand(Session& session, const std::vector<std::string>& args, const Options& options);
 
 }  // namespace tool
 

@@ -35,6 +35,11 @@ void PrintUsage(std::FILE* to) {
       "                               channels, grid, matrix and table sizes (with --json,\n"
       "                               every value: the file --lut-from takes)\n"
       "  edit PROFILE EDIT... [-o OUT]  change tags, then save the profile (to OUT if given)\n"
+      "  embed IMAGE PROFILE -o OUT [--replace]\n"
+      "                               write OUT: the PNG, JPEG or TIFF IMAGE with PROFILE\n"
+      "                               embedded, its pixel data copied unchanged; an image\n"
+      "                               that carries a profile needs --replace\n"
+      "  extract IMAGE -o OUT.icc     write the profile that IMAGE carries to OUT.icc\n"
       "\n"
       "A PROFILE is a file, or one of the built-in profiles:\n",
       to);
@@ -126,6 +131,8 @@ int main(int argc, char** argv) {
       if (i + 2 >= argc) return Usage("--lut-from needs a JSON file and a tag signature");
       options.edits.push_back({tool::Edit::LutFrom, argv[i + 1], argv[i + 2]});
       i += 2;
+    } else if (arg == "--replace") {
+      options.replace = true;
     } else if (arg == "--verbose") {
       verbose = true;
     } else if (arg == "--plugin" || arg == "--via" || arg == "--intent") {
@@ -149,11 +156,14 @@ int main(int argc, char** argv) {
   const std::string command = words.front();
   const std::vector<std::string> args(words.begin() + 1, words.end());
   if (command != "info" && command != "convert" && command != "gamut" && command != "list" && command != "tags" &&
-      command != "tag" && command != "edit")
+      command != "tag" && command != "edit" && command != "embed" && command != "extract")
     return Usage("unknown command " + command);
   if (options.raw && command != "tag") return Usage("--raw belongs to the tag command");
-  if ((!options.edits.empty() || !options.output.empty()) && command != "edit")
-    return Usage("--desc, --copyright, --remove, --copy-tag, --lut-from and -o belong to the edit command");
+  if (!options.edits.empty() && command != "edit")
+    return Usage("--desc, --copyright, --remove, --copy-tag and --lut-from belong to the edit command");
+  if (!options.output.empty() && command != "edit" && command != "embed" && command != "extract")
+    return Usage("-o belongs to the edit command, and to embed and extract");
+  if (options.replace && command != "embed") return Usage("--replace belongs to the embed command");
 
   std::unique_ptr<tool::Session> session;
   try {
@@ -164,6 +174,8 @@ int main(int argc, char** argv) {
     if (command == "tags") return tool::TagsCommand(*session, args, options);
     if (command == "tag") return tool::TagCommand(*session, args, options);
     if (command == "edit") return tool::EditCommand(*session, args, options);
+    if (command == "embed") return tool::EmbedCommand(*session, args, options);
+    if (command == "extract") return tool::ExtractCommand(*session, args, options);
     return tool::ListCommand(*session, args, options);
   } catch (const tool::UsageError& e) {
     return Usage(e.what());

@@ -367,3 +367,53 @@ TEST_F(ProfileFiles, SpecialFilesAreNotProfiles) {
 }
 
 }  // namespace
+
+namespace {
+
+// A profile larger than what is read whole at open keeps its file and reads each element
+// when first used: through a rename it still reads the bytes it was opened on; cut short
+// in place, the lost elements read as unreadable, the profile is not valid, and a change
+// is not written back over the file.
+TEST_F(ProfileFiles, LargeProfilesReadElementsFromTheFileTheyOpened) {
+  const Bytes original = ReadBytes(IccPath("ITULab.icc"));
+  ASSERT_GT(original.size(), 64u * 1024);
+  const std::vector<TagEntry> table = TagTable(original);
+  ASSERT_FALSE(table.empty());
+  const std::string path = CopyOf("ITULab.icc", "big.icc");
+
+  HPROFILE h = OpenPath(path, PROFILE_READWRITE, OPEN_EXISTING);
+  ASSERT_NE(h, nullptr);
+  WriteBytes(Posix("other.icc"), ReadBytes(IccPath("Gray.icc")));
+  ASSERT_EQ(std::rename(Posix("other.icc").c_str(), Posix("big.icc").c_str()), 0);
+  for (const TagEntry& t : table) {
+    Bytes got(t.size);
+    DWORD n = t.size;
+    ASSERT_TRUE(GetColorProfileElement(h, t.signature, 0, &n, got.data(), nullptr));
+    EXPECT_EQ(got, TagBytes(original, t));
+  }
+  Bytes whole;
+  ASSERT_TRUE(win32::icm::SerializeProfile(h, whole));
+  EXPECT_EQ(whole, original) << "byte-faithful from the file it opened";
+  ASSERT_TRUE(CloseColorProfile(h));
+
+  const std::string cut = CopyOf("ITULab.icc", "cut.icc");
+  h = OpenPath(cut, PROFILE_READWRITE, OPEN_EXISTING);
+  ASSERT_NE(h, nullptr);
+  ASSERT_EQ(truncate(Posix("cut.icc").c_str(), 200), 0);
+  const TagEntry& last = table.back();
+  Bytes got(last.size);
+  DWORD n = last.size;
+  EXPECT_WIN32(GetColorProfileElement(h, last.signature, 0, &n, got.data(), nullptr), FALSE, ERROR_INVALID_PROFILE);
+  n = 4;
+  EXPECT_WIN32(SetColorProfileElement(h, last.signature, 0, &n, got.data()), FALSE, ERROR_INVALID_PROFILE);
+  EXPECT_WIN32(SetColorProfileElementSize(h, last.signature, 8), FALSE, ERROR_INVALID_PROFILE);
+  BOOL valid = TRUE;
+  EXPECT_WIN32(IsColorProfileValid(h, &valid), FALSE, ERROR_INVALID_PROFILE);
+  PROFILEHEADER header;
+  ASSERT_TRUE(GetColorProfileHeader(h, &header));
+  ASSERT_TRUE(SetColorProfileHeader(h, &header));
+  EXPECT_WIN32(CloseColorProfile(h), FALSE, ERROR_INVALID_PROFILE);
+  EXPECT_EQ(ReadBytes(Posix("cut.icc")), Bytes(original.begin(), original.begin() + 200)) << "left as it was";
+}
+
+}  // namespace

@@ -432,3 +432,86 @@ TEST_F(FileTest, RemoveDirectoryAndSetFileAttributes) {
 }
 
 }  // namespace
+
+namespace {
+
+using ReadFileTest = FileTest;
+using MoveFileExATest = FileTest;
+
+TEST_F(ReadFileTest, ReadsOnFromThePositionAndSizesTheFile) {
+  const std::string content = "J" + std::string(3 << 20, 'r') + "END";
+  Put("f", content);
+  const DWORD share = FILE_SHARE_READ | FILE_SHARE_WRITE;
+  HANDLE h = CreateFileA(Win("f").c_str(), GENERIC_READ, share, nullptr, OPEN_EXISTING, 0, nullptr);
+  HANDLE writeOnly = CreateFileA(Win("f").c_str(), GENERIC_WRITE, share, nullptr, OPEN_EXISTING, 0, nullptr);
+  ASSERT_NE(h, INVALID_HANDLE_VALUE);
+  ASSERT_NE(writeOnly, INVALID_HANDLE_VALUE);
+  LARGE_INTEGER size;
+  size.QuadPart = -1;
+  EXPECT_WIN32(GetFileSizeEx(h, &size), TRUE, ERROR_SUCCESS);
+  EXPECT_EQ(size.QuadPart, static_cast<LONGLONG>(content.size()));
+  EXPECT_WIN32(GetFileSizeEx(h, nullptr), FALSE, ERROR_INVALID_PARAMETER);
+
+  std::string got(content.size() + 10, '\0');
+  DWORD n = kSentinel;
+  EXPECT_WIN32(ReadFile(h, &got[0], 1, &n, nullptr), TRUE, ERROR_SUCCESS);
+  EXPECT_EQ(n, 1u);
+  // The rest, asked for with room to spare: a short count at the end is success.
+  EXPECT_WIN32(ReadFile(h, &got[1], static_cast<DWORD>(got.size() - 1), &n, nullptr), TRUE, ERROR_SUCCESS);
+  EXPECT_EQ(n, content.size() - 1);
+  EXPECT_EQ(got.substr(0, content.size()), content);
+  EXPECT_WIN32(ReadFile(h, &got[0], 4, &n, nullptr), TRUE, ERROR_SUCCESS);
+  EXPECT_EQ(n, 0u) << "at the end";
+
+  char overlapped[32] = {};
+  EXPECT_WIN32(ReadFile(h, &got[0], 3, nullptr, nullptr), FALSE, ERROR_INVALID_PARAMETER);
+  EXPECT_WIN32(ReadFile(h, &got[0], 3, &n, overlapped), FALSE, ERROR_INVALID_PARAMETER);
+  EXPECT_WIN32(ReadFile(h, nullptr, 3, &n, nullptr), FALSE, ERROR_INVALID_PARAMETER);
+  n = kSentinel;
+  EXPECT_WIN32(ReadFile(writeOnly, &got[0], 3, &n, nullptr), FALSE, ERROR_ACCESS_DENIED);
+  EXPECT_EQ(n, 0u);
+  EXPECT_WIN32(GetFileSizeEx(writeOnly, &size), TRUE, ERROR_SUCCESS);  // needs no read access
+  EXPECT_WIN32(CloseHandle(writeOnly), TRUE, ERROR_SUCCESS);
+  EXPECT_WIN32(CloseHandle(h), TRUE, ERROR_SUCCESS);
+  WIN32_FIND_DATAA data;
+  HANDLE find = FindFirstFileA(Win("*").c_str(), &data);
+  for (HANDLE bad : {h, INVALID_HANDLE_VALUE, HANDLE{nullptr}, find}) {
+    EXPECT_WIN32(ReadFile(bad, &got[0], 3, &n, nullptr), FALSE, ERROR_INVALID_HANDLE);
+    EXPECT_WIN32(GetFileSizeEx(bad, &size), FALSE, ERROR_INVALID_HANDLE);
+  }
+  FindClose(find);
+}
+
+TEST_F(MoveFileExATest, MovesReplacesOnlyWhenAskedAndRefusesWithTheCodes) {
+  const DWORD replace = MOVEFILE_REPLACE_EXISTING;
+  const struct {
+    const char* from;
+    std::string to;
+    DWORD flags, code;
+  } refused[] = {
+      {"a", Win("b"), 0, ERROR_ALREADY_EXISTS},
+      {"a", Win("ro"), replace, ERROR_ACCESS_DENIED},
+      {"a", Win("dir"), replace, ERROR_ACCESS_DENIED},
+      {"a", Win("nofolder/b"), replace, ERROR_PATH_NOT_FOUND},
+      {"a", "C:\\b", replace, ERROR_PATH_NOT_FOUND},
+      {"a", TooLong(), replace, ERROR_FILENAME_EXCED_RANGE},
+      {"a", Win("b"), MOVEFILE_DELAY_UNTIL_REBOOT, ERROR_INVALID_PARAMETER},
+      {"missing", Win("c"), replace, ERROR_FILE_NOT_FOUND},
+  };
+  Put("a", "new");
+  Put("b", "old");
+  for (const auto& c : refused) {
+    SCOPED_TRACE(c.to + " " + std::to_string(c.flags));
+    EXPECT_WIN32(MoveFileExA(Win(c.from).c_str(), c.to.c_str(), c.flags), FALSE, c.code);
+  }
+  EXPECT_EQ(Listing(), (std::set<std::string>{"a", "b", "ro", "dir"}));
+  EXPECT_EQ(Get("b"), "old");
+
+  EXPECT_WIN32(MoveFileExA(Win("a").c_str(), Win("c").c_str(), 0), TRUE, ERROR_SUCCESS);
+  EXPECT_WIN32(MoveFileExA(Win("c").c_str(), Win("b").c_str(), replace | MOVEFILE_WRITE_THROUGH), TRUE,
+               ERROR_SUCCESS);
+  EXPECT_EQ(Listing(), (std::set<std::string>{"b", "ro", "dir"}));
+  EXPECT_EQ(Get("b"), "new");
+}
+
+}  // namespace

@@ -40,6 +40,11 @@ TEST_F(PluginTest, RegistersItsClassesAndGlobalsWithTheStoredDeclarations) {
   EXPECT_EQ(globals, (std::vector<std::string>{"halvoRegisterDebugger(debugger as halvoDebugger)",
                                                "halvoUnregisterDebugger()", "CMError() as Integer",
                                                "CMErrorMessage() as string",
+                                               "GetImageSpace(f as Folderitem) as String",
+                                               "EmbedImage(fromf as folderitem, tof as folderitem, replace as "
+                                               "boolean, p as Profile) as Boolean",
+                                               "ImageProfileCount(f as folderitem) as Integer",
+                                               "GetImageProfile(f as folderitem, index as Integer) as Profile",
                                                "NewConcatColorWorld(keyindex as Integer, p1 as Profile, p2 as "
                                                "Profile, p3 as Profile, p4 as Profile) as ColorWorld"}));
 

@@ -392,3 +392,50 @@ TEST(Tool, RefusesMalformedLutFiles) {
 }
 
 }  // namespace
+
+#if TINTWELL_IMAGE_FILES
+#include "image_files.h"
+
+namespace {
+
+TEST(Tool, EmbedsAndExtractsImageProfiles) {
+  const std::string dir = ::testing::TempDir() + "tw_img_" + std::to_string(getpid()) + "_";
+  const std::string icc = std::string(TINTWELL_ICC_DIR) + "/sRGB.icc", lab = std::string(TINTWELL_ICC_DIR) + "/ITULab.icc";
+  testimage::Make(testimage::Kind::Png, dir + "a.png", 9, 7, 3, {});
+  Result r = RunTool("embed " + dir + "a.png " + icc + " -o " + dir + "b.png");
+  ASSERT_EQ(r.status, 0) << r.err;
+  r = RunTool("extract " + dir + "b.png -o " + dir + "p.icc");
+  ASSERT_EQ(r.status, 0) << r.err;
+  EXPECT_EQ(testimage::ReadFile(dir + "p.icc"), testimage::ReadFile(icc));
+
+  testimage::Make(testimage::Kind::Jpeg, dir + "c.jpg", 9, 7, 3, testimage::ReadFile(icc));
+  r = RunTool("embed " + dir + "c.jpg " + lab + " -o " + dir + "d.jpg");
+  EXPECT_EQ(r.status, 1);
+  EXPECT_NE(r.err.find("already carries a profile"), std::string::npos) << r.err;
+  r = RunTool("embed --replace " + dir + "c.jpg " + lab + " -o " + dir + "d.jpg");
+  ASSERT_EQ(r.status, 0) << r.err;
+  EXPECT_EQ(testimage::Read(testimage::Kind::Jpeg, dir + "d.jpg").profile, testimage::ReadFile(lab));
+
+  const struct {
+    std::string args;
+    int status;
+    const char* message;
+  } failures[] = {
+      {"extract " + dir + "a.png -o " + dir + "q.icc", 1, "carries no profile"},
+      {"extract " + icc + " -o " + dir + "q.icc", 1, "not a readable PNG, JPEG or TIFF"},
+      {"extract " + dir + "missing.png -o " + dir + "q.icc", 1, "cannot read"},
+      {"embed " + dir + "a.png " + icc, 2, "embed takes IMAGE PROFILE -o OUT"},
+      {"extract " + dir + "a.png", 2, "extract takes IMAGE -o OUT.icc"},
+      {"info srgb --replace", 2, "--replace belongs to the embed command"},
+  };
+  for (const auto& f : failures) {
+    r = RunTool(f.args);
+    EXPECT_EQ(r.status, f.status) << f.args;
+    EXPECT_NE(r.err.find(f.message), std::string::npos) << r.err;
+  }
+  EXPECT_NE(access((dir + "q.icc").c_str(), F_OK), 0);
+  for (const char* name : {"a.png", "b.png", "p.icc", "c.jpg", "d.jpg"}) std::remove((dir + name).c_str());
+}
+
+}  // namespace
+#endif

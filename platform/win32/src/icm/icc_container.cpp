@@ -26,6 +26,38 @@ void WriteBE32(std::uint8_t* p, std::uint32_t value) {
   p[3] = static_cast<std::uint8_t>(value);
 }
 
+bool MemorySource::ReadAt(std::uint64_t offset, std::size_t size, std::uint8_t* out) const {
+  if (offset > bytes_->size() || size > bytes_->size() - offset) return false;
+  if (size != 0) std::memcpy(out, bytes_->data() + offset, size);
+  return true;
+}
+
+Block::Block(std::shared_ptr<const ByteSource> source, std::uint64_t offset, std::size_t size)
+    : source_(std::move(source)), view_(nullptr), size_(size), offset_(offset) {
+  if (const std::uint8_t* memory = source_->Memory()) {
+    view_ = memory + offset;
+  } else {
+    state_ = State::Pending;
+  }
+}
+
+bool Block::Load() const {
+  if (state_ == State::Pending) {
+    // The element's own bytes, read in one go; a short read means the file changed
+    // under the open profile, and no bytes are made up in its place.
+    own_.resize(size_);
+    if (source_->ReadAt(offset_, size_, own_.data())) {
+      state_ = State::Ready;
+      view_ = own_.data();
+    } else {
+      state_ = State::Unreadable;
+      Bytes().swap(own_);
+    }
+    source_.reset();
+  }
+  return state_ == State::Ready;
+}
+
 std::uint8_t* Block::MutableData() {
   if (source_) {
     own_.assign(view_, view_ + size_);
@@ -43,24 +75,40 @@ void Block::Resize(std::size_t size) {
 }
 
 DWORD IccContainer::Parse(std::shared_ptr<const Bytes> bytes, IccContainer& out) {
-  const std::uint8_t* data = bytes->data();
-  const std::size_t size = bytes->size();
+  const std::uint64_t size = bytes->size();
+  return Parse(std::make_shared<MemorySource>(std::move(bytes)), size, out);
+}
+
+DWORD IccContainer::Parse(std::shared_ptr<const ByteSource> source, std::uint64_t size, IccContainer& out) {
   if (size < kMinProfileSize || size > kMaxProfileSize) return ERROR_INVALID_PROFILE;
-  if (ReadBE32(data + kOffsetSignature) != kSignatureAcsp) return ERROR_INVALID_PROFILE;
+  std::uint8_t head[kMinProfileSize];
+  if (!source->ReadAt(0, kMinProfileSize, head)) return ERROR_INVALID_PROFILE;
+  if (ReadBE32(head + kOffsetSignature) != kSignatureAcsp) return ERROR_INVALID_PROFILE;
 
   // Bytes after a smaller declared size are not part of the profile; a larger declared
   // size (a truncated file) is left for the validity check to report.
   std::uint64_t extent = size;
-  const std::uint32_t declared = ReadBE32(data + kOffsetSize);
+  const std::uint32_t declared = ReadBE32(head + kOffsetSize);
   if (declared >= kMinProfileSize && declared < extent) extent = declared;
 
-  const std::uint64_t count = ReadBE32(data + kHeaderSize);
+  // The count is checked against the bytes that could hold its entries before it sizes
+  // anything.
+  const std::uint64_t count = ReadBE32(head + kHeaderSize);
   if (count > (extent - kMinProfileSize) / kTagEntrySize) return ERROR_INVALID_PROFILE;
+  const std::size_t tableSize = static_cast<std::size_t>(count * kTagEntrySize);
+  const std::uint8_t* table;
+  Bytes tableCopy;
+  if (const std::uint8_t* memory = source->Memory()) {
+    table = memory + kMinProfileSize;
+  } else {
+    tableCopy.resize(tableSize);
+    if (!source->ReadAt(kMinProfileSize, tableSize, tableCopy.data())) return ERROR_INVALID_PROFILE;
+    table = tableCopy.data();
+  }
 
-  // Check the whole table before copying anything.
+  // Check the whole table before using any of it.
   std::unordered_set<std::uint32_t> seen;
   seen.reserve(static_cast<std::size_t>(count));
-  const std::uint8_t* table = data + kMinProfileSize;
   for (std::uint64_t i = 0; i < count; ++i) {
     const std::uint8_t* entry = table + i * kTagEntrySize;
     const std::uint64_t offset = ReadBE32(entry + 4);
@@ -71,7 +119,7 @@ DWORD IccContainer::Parse(std::shared_ptr<const Bytes> bytes, IccContainer& out)
   }
 
   IccContainer result;
-  std::memcpy(result.header_.data(), data, kHeaderSize);
+  std::memcpy(result.header_.data(), head, kHeaderSize);
   result.byte_size_ = extent;
   result.tags_.reserve(static_cast<std::size_t>(count));
   std::unordered_map<std::uint64_t, std::shared_ptr<Block>> blocks;  // (offset, size) -> data
@@ -80,7 +128,7 @@ DWORD IccContainer::Parse(std::shared_ptr<const Bytes> bytes, IccContainer& out)
     const std::uint32_t offset = ReadBE32(entry + 4);
     const std::uint32_t length = ReadBE32(entry + 8);
     std::shared_ptr<Block>& block = blocks[(std::uint64_t{offset} << 32) | length];
-    if (!block) block = std::make_shared<Block>(bytes, offset, length);
+    if (!block) block = std::make_shared<Block>(source, offset, length);
     result.tags_.push_back(Tag{ReadBE32(entry), block});
   }
   result.RebuildIndex();
@@ -113,6 +161,7 @@ bool IccContainer::IsShared(std::uint32_t signature) const {
   return it != index_.end() && tags_[it->second].data.use_count() > 1;
 }
 
+// Callers have loaded the block.
 Block& IccContainer::OwnBlock(std::size_t index) {
   std::shared_ptr<Block>& data = tags_[index].data;
   if (data.use_count() > 1) data = std::make_shared<Block>(data->data(), data->size());
@@ -124,7 +173,7 @@ std::size_t IccContainer::WriteElement(std::uint32_t signature, std::size_t offs
   auto it = index_.find(signature);
   if (it == index_.end()) return 0;
   const Block& current = *tags_[it->second].data;
-  if (offset >= current.size() || count == 0) return 0;
+  if (offset >= current.size() || count == 0 || !current.Load()) return 0;
   const std::size_t n = count < current.size() - offset ? count : current.size() - offset;
   std::memcpy(OwnBlock(it->second).MutableData() + offset, data, n);
   return n;
@@ -149,6 +198,7 @@ DWORD IccContainer::ResizeElement(std::uint32_t signature, std::size_t size) {
       tags_.push_back(Tag{signature, std::make_shared<Block>(size)});
       index_[signature] = tags_.size() - 1;
     } else {
+      if (!tags_[it->second].data->Load()) return ERROR_INVALID_PROFILE;
       OwnBlock(it->second).Resize(size);
     }
   }
@@ -184,9 +234,11 @@ std::uint64_t IccContainer::SerializedSize() const {
   return AlignUp4(total);
 }
 
-Bytes IccContainer::Serialize() const {
+DWORD IccContainer::Serialize(Bytes& result) const {
   const std::uint64_t total = SerializedSize();
   if (total > kMaxProfileSize) throw std::bad_alloc();
+  for (const Tag& tag : tags_)
+    if (!tag.data->Load()) return ERROR_INVALID_PROFILE;
   Bytes out(header_.begin(), header_.end());
   out.resize(static_cast<std::size_t>(total), 0);
   WriteBE32(out.data() + kOffsetSize, static_cast<std::uint32_t>(total));
@@ -208,7 +260,8 @@ Bytes IccContainer::Serialize() const {
     WriteBE32(entry + 8, static_cast<std::uint32_t>(tag.data->size()));
     entry += kTagEntrySize;
   }
-  return out;
+  result = std::move(out);
+  return ERROR_SUCCESS;
 }
 
 }  // namespace win32::icm

@@ -1,5 +1,6 @@
 // The mscms profile calls over IccContainer: open, close (write-back), header and
 // element access. Every call leaves the last error at 0 on success.
+#include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -59,6 +60,61 @@ auto Guarded(Body&& body) -> decltype(body()) {
   }
 }
 
+// A profile file kept open for reading the tag data that is used later. Reading after
+// the open sees the file as it was opened even when it has been replaced by a rename (an
+// atomic save); one that was cut short in place reads short, and the elements it held
+// are then unreadable.
+class FileSource : public ByteSource {
+ public:
+  explicit FileSource(int fd) : fd_(fd) {}
+  FileSource(const FileSource&) = delete;
+  FileSource& operator=(const FileSource&) = delete;
+  ~FileSource() override { close(fd_); }
+  const std::uint8_t* Memory() const override { return nullptr; }
+  bool ReadAt(std::uint64_t offset, std::size_t size, std::uint8_t* out) const override {
+    std::size_t done = 0;
+    while (done < size) {
+      const ssize_t n = pread(fd_, out + done, size - done, static_cast<off_t>(offset + done));
+      if (n < 0 && errno == EINTR) continue;
+      if (n <= 0) return false;
+      done += static_cast<std::size_t>(n);
+    }
+    return true;
+  }
+
+ private:
+  int fd_;
+};
+
+// Files up to this size are read whole at open and closed again: that costs about as
+// much as reading the tag table alone and holds no descriptor. Larger ones keep their
+// descriptor and read each element when it is first used, so that opening one to read
+// its header or a single tag does not read all of it.
+constexpr std::uint64_t kReadWholeLimit = 64 * 1024;
+
+// Parses the profile file at path (known to exist) into icc.
+DWORD ParseProfileFile(const std::string& path, IccContainer& icc) {
+  // Not blocking, so that a named pipe is refused rather than waited on.
+  const int fd = open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK);
+  if (fd < 0) return ErrorFromErrno(errno);
+  std::shared_ptr<const FileSource> source;
+  try {
+    source = std::make_shared<const FileSource>(fd);
+  } catch (...) {
+    close(fd);
+    throw;
+  }
+  struct stat st;
+  if (fstat(fd, &st) != 0) return ErrorFromErrno(errno);
+  if (!S_ISREG(st.st_mode)) return ERROR_ACCESS_DENIED;  // a device or pipe is no profile
+  const std::uint64_t size = static_cast<std::uint64_t>(st.st_size);
+  if (size > kMaxProfileSize) return ERROR_INVALID_PROFILE;
+  if (size > kReadWholeLimit) return IccContainer::Parse(source, size, icc);
+  auto bytes = std::make_shared<Bytes>(static_cast<std::size_t>(size));
+  if (!source->ReadAt(0, bytes->size(), bytes->data())) return ERROR_INVALID_PROFILE;  // shrank meanwhile
+  return IccContainer::Parse(std::move(bytes), icc);
+}
+
 LockedProfile Lookup(HPROFILE handle) {
   return LockedProfile(Handles().Lookup<OpenProfile>(handle, HandleKind::Profile));
 }
@@ -85,12 +141,7 @@ DWORD OpenFile(const char* name, DWORD creation, OpenProfile& profile) {
     return ERROR_ACCESS_DENIED;
   }
 
-  if (exists && (creation == OPEN_EXISTING || creation == OPEN_ALWAYS)) {
-    auto bytes = std::make_shared<Bytes>();
-    code = ReadFileBytes(profile.path, *bytes);
-    if (code != ERROR_SUCCESS) return code;
-    return IccContainer::Parse(std::move(bytes), profile.icc);
-  }
+  if (exists && (creation == OPEN_EXISTING || creation == OPEN_ALWAYS)) return ParseProfileFile(profile.path, profile.icc);
   profile.icc = IccContainer::Blank();
   profile.changed = true;
   return ERROR_SUCCESS;
@@ -102,8 +153,8 @@ BOOL SerializeProfile(HPROFILE handle, std::vector<std::uint8_t>& bytes) {
   return Guarded([&]() -> BOOL {
     auto profile = Lookup(handle);
     if (!profile) return Fail(ERROR_INVALID_HANDLE);
-    bytes = profile->icc.Serialize();
-    return Succeed();
+    const DWORD code = profile->icc.Serialize(bytes);
+    return code == ERROR_SUCCESS ? Succeed() : Fail(code);
   });
 }
 
@@ -149,8 +200,11 @@ extern "C" BOOL WINAPI CloseColorProfile(HPROFILE hProfile) {
     const LockedProfile profile(win32::Handles().Remove<OpenProfile>(hProfile, win32::HandleKind::Profile));
     if (!profile) return Fail(ERROR_INVALID_HANDLE);
     if (profile->writable && profile->changed && !profile->path.empty()) {
-      const std::vector<std::uint8_t> bytes = profile->icc.Serialize();
-      const DWORD code = win32::WriteFileAtomically(profile->path, bytes.data(), bytes.size());
+      // A profile whose file lost tag data since the open is not written: the file keeps
+      // what it holds rather than a profile with bytes made up.
+      std::vector<std::uint8_t> bytes;
+      DWORD code = profile->icc.Serialize(bytes);
+      if (code == ERROR_SUCCESS) code = win32::WriteFileAtomically(profile->path, bytes.data(), bytes.size());
       if (code != ERROR_SUCCESS) return Fail(code);
     }
     return Succeed();
@@ -189,11 +243,13 @@ extern "C" BOOL WINAPI SetColorProfileHeader(HPROFILE hProfile, PPROFILEHEADER p
 }
 
 extern "C" BOOL WINAPI IsColorProfileValid(HPROFILE hProfile, PBOOL pbValid) {
-  auto profile = Lookup(hProfile);
-  if (!profile) return Fail(ERROR_INVALID_HANDLE);
-  if (pbValid == nullptr) return Fail(ERROR_INVALID_PARAMETER);
-  *pbValid = IsUsableProfile(profile->icc) ? TRUE : FALSE;
-  return *pbValid ? Succeed() : Fail(ERROR_INVALID_PROFILE);
+  return Guarded([&]() -> BOOL {  // reading a table of a file profile may allocate
+    auto profile = Lookup(hProfile);
+    if (!profile) return Fail(ERROR_INVALID_HANDLE);
+    if (pbValid == nullptr) return Fail(ERROR_INVALID_PARAMETER);
+    *pbValid = IsUsableProfile(profile->icc) ? TRUE : FALSE;
+    return *pbValid ? Succeed() : Fail(ERROR_INVALID_PROFILE);
+  });
 }
 
 extern "C" BOOL WINAPI GetCountColorProfileElements(HPROFILE hProfile, PDWORD pnCount) {
@@ -225,22 +281,25 @@ extern "C" BOOL WINAPI IsColorProfileTagPresent(HPROFILE hProfile, TAGTYPE tag, 
 // Otherwise min(*pcbElement, size - offset) bytes are copied; pbReference is optional.
 extern "C" BOOL WINAPI GetColorProfileElement(HPROFILE hProfile, TAGTYPE tag, DWORD dwOffset,
                                               PDWORD pcbElement, PVOID pElement, PBOOL pbReference) {
-  auto profile = Lookup(hProfile);
-  if (!profile) return Fail(ERROR_INVALID_HANDLE);
-  if (pcbElement == nullptr) return Fail(ERROR_INVALID_PARAMETER);
-  const Block* element = profile->icc.Element(tag);
-  if (element == nullptr) return Fail(ERROR_TAG_NOT_FOUND);
-  if (pElement == nullptr) {
-    *pcbElement = static_cast<DWORD>(element->size());
-    return Fail(ERROR_INSUFFICIENT_BUFFER);
-  }
-  if (dwOffset > element->size()) return Fail(ERROR_INVALID_PARAMETER);
-  const std::size_t left = element->size() - dwOffset;
-  const std::size_t n = *pcbElement < left ? *pcbElement : left;
-  if (n > 0) std::memcpy(pElement, element->data() + dwOffset, n);
-  *pcbElement = static_cast<DWORD>(n);
-  if (pbReference != nullptr) *pbReference = profile->icc.IsShared(tag) ? TRUE : FALSE;
-  return Succeed();
+  return Guarded([&]() -> BOOL {  // the first read of a file profile's element allocates
+    auto profile = Lookup(hProfile);
+    if (!profile) return Fail(ERROR_INVALID_HANDLE);
+    if (pcbElement == nullptr) return Fail(ERROR_INVALID_PARAMETER);
+    const Block* element = profile->icc.Element(tag);
+    if (element == nullptr) return Fail(ERROR_TAG_NOT_FOUND);
+    if (pElement == nullptr) {
+      *pcbElement = static_cast<DWORD>(element->size());
+      return Fail(ERROR_INSUFFICIENT_BUFFER);
+    }
+    if (dwOffset > element->size()) return Fail(ERROR_INVALID_PARAMETER);
+    if (!element->Load()) return Fail(ERROR_INVALID_PROFILE);
+    const std::size_t left = element->size() - dwOffset;
+    const std::size_t n = *pcbElement < left ? *pcbElement : left;
+    if (n > 0) std::memcpy(pElement, element->data() + dwOffset, n);
+    *pcbElement = static_cast<DWORD>(n);
+    if (pbReference != nullptr) *pbReference = profile->icc.IsShared(tag) ? TRUE : FALSE;
+    return Succeed();
+  });
 }
 
 // Writes inside the element only: it never grows, and *pcbElement returns the count.
@@ -254,6 +313,7 @@ extern "C" BOOL WINAPI SetColorProfileElement(HPROFILE hProfile, TAGTYPE tag, DW
     const Block* element = profile->icc.Element(tag);
     if (element == nullptr) return Fail(ERROR_TAG_NOT_FOUND);
     if (dwOffset > element->size()) return Fail(ERROR_INVALID_PARAMETER);
+    if (!element->Load()) return Fail(ERROR_INVALID_PROFILE);
     *pcbElement = static_cast<DWORD>(profile->icc.WriteElement(tag, dwOffset, pElement, *pcbElement));
     profile->changed = true;
     return Succeed();

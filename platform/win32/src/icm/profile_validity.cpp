@@ -38,7 +38,7 @@ bool LutFits(const Block& block) {
 
 bool Usable(const IccContainer& profile, std::uint32_t signature) {
   const Block* block = profile.Element(signature);
-  return block != nullptr && block->size() >= kMinTagSize && ReadBE32(block->data()) != 0;
+  return block != nullptr && block->size() >= kMinTagSize && block->Load() && ReadBE32(block->data()) != 0;
 }
 
 // The tags that hold lookup tables: A2B0-2, B2A0-2, gamt, pre0-2.
@@ -55,7 +55,8 @@ bool IsUsableProfile(const IccContainer& profile) {
   if (ReadBE32(header + kOffsetSize) != profile.ByteSize()) return false;
   for (std::uint32_t signature : kLutTags) {
     const Block* block = profile.Element(signature);
-    if (block != nullptr && block->size() >= 4 && !LutFits(*block)) return false;
+    // A table whose bytes can no longer be read makes the profile unusable.
+    if (block != nullptr && block->size() >= 4 && (!block->Load() || !LutFits(*block))) return false;
   }
 
   switch (ReadBE32(header + kOffsetClass)) {

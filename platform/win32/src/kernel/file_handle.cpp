@@ -1,5 +1,5 @@
-// CreateFileA, WriteFile and CloseHandle for files written in binary, as the plugin
-// writes a profile it has built.
+// CreateFileA, ReadFile, WriteFile, GetFileSizeEx and CloseHandle for files read and
+// written in binary, as the plugin reads images and writes the files it builds.
 #include <fcntl.h>
 #include <sys/file.h>
 #include <sys/stat.h>
@@ -18,13 +18,14 @@
 namespace {
 
 struct OpenFile {
-  explicit OpenFile(bool canWrite) : writable(canWrite) {}
+  OpenFile(bool canRead, bool canWrite) : readable(canRead), writable(canWrite) {}
   OpenFile(const OpenFile&) = delete;
   OpenFile& operator=(const OpenFile&) = delete;
   ~OpenFile() {
     if (fd >= 0) close(fd);
   }
   int fd = -1;
+  const bool readable;
   const bool writable;
 };
 
@@ -101,7 +102,7 @@ HANDLE CreateFileImpl(LPCSTR name, DWORD access, DWORD shareMode, DWORD disposit
   // A new file asked to be read-only is made so; this handle may still write it.
   const mode_t mode = (attributes & FILE_ATTRIBUTE_READONLY) ? 0444 : 0666;
   // Made before the open, so an allocation failure never orphans a descriptor.
-  auto file = std::make_shared<OpenFile>(canWrite);
+  auto file = std::make_shared<OpenFile>((access & GENERIC_READ) != 0, canWrite);
   bool existed = false;
   file->fd = OpenAs(path, disposition, accessFlags, mode, &existed, &err);
   if (file->fd >= 0) {
@@ -166,6 +167,63 @@ extern "C" BOOL WINAPI WriteFile(HANDLE hFile, LPCVOID lpBuffer, DWORD nNumberOf
     left -= static_cast<DWORD>(n);
     *lpNumberOfBytesWritten += static_cast<DWORD>(n);
   }
+  SetLastError(ERROR_SUCCESS);
+  return TRUE;
+}
+
+// Reads up to the count from the file position; at the end of the file it succeeds with
+// fewer bytes, or none.
+extern "C" BOOL WINAPI ReadFile(HANDLE hFile, LPVOID lpBuffer, DWORD nNumberOfBytesToRead,
+                                LPDWORD lpNumberOfBytesRead, void* lpOverlapped) {
+  const auto file = win32::Handles().Lookup<OpenFile>(hFile, win32::HandleKind::File);
+  if (!file) {
+    SetLastError(ERROR_INVALID_HANDLE);
+    return FALSE;
+  }
+  if (lpNumberOfBytesRead == nullptr || lpOverlapped != nullptr ||
+      (lpBuffer == nullptr && nNumberOfBytesToRead != 0)) {
+    SetLastError(ERROR_INVALID_PARAMETER);
+    return FALSE;
+  }
+  *lpNumberOfBytesRead = 0;
+  if (!file->readable) {
+    SetLastError(ERROR_ACCESS_DENIED);
+    return FALSE;
+  }
+  char* p = static_cast<char*>(lpBuffer);
+  DWORD left = nNumberOfBytesToRead;
+  while (left > 0) {
+    const ssize_t n = read(file->fd, p, left);
+    if (n < 0) {
+      if (errno == EINTR) continue;
+      SetLastError(errno == EISDIR ? ERROR_ACCESS_DENIED : ERROR_READ_FAULT);
+      return FALSE;
+    }
+    if (n == 0) break;
+    p += n;
+    left -= static_cast<DWORD>(n);
+    *lpNumberOfBytesRead += static_cast<DWORD>(n);
+  }
+  SetLastError(ERROR_SUCCESS);
+  return TRUE;
+}
+
+extern "C" BOOL WINAPI GetFileSizeEx(HANDLE hFile, PLARGE_INTEGER lpFileSize) {
+  const auto file = win32::Handles().Lookup<OpenFile>(hFile, win32::HandleKind::File);
+  if (!file) {
+    SetLastError(ERROR_INVALID_HANDLE);
+    return FALSE;
+  }
+  if (lpFileSize == nullptr) {
+    SetLastError(ERROR_INVALID_PARAMETER);
+    return FALSE;
+  }
+  struct stat st;
+  if (fstat(file->fd, &st) != 0) {
+    SetLastError(win32::ErrorFromErrno(errno));
+    return FALSE;
+  }
+  lpFileSize->QuadPart = static_cast<LONGLONG>(st.st_size);
   SetLastError(ERROR_SUCCESS);
   return TRUE;
 }
