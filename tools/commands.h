@@ -34,6 +34,8 @@ int GamutCommand(Session& session, const std::vector<std::string>& args, const O
 int TagsCommand(Session& session, const std::vector<std::string>& args, const Options& options);
 int TagCommand(Session& session, const std::vector<std::string>& args, const Options& options);
 int EditCommand(Session& session, const std::vector<std::string>& args, const Options& options);
+// An image file through a colour world: tools/picture_command.cpp
+int PictureCommand(Session& session, const std::vector<std::string>& args, const Options& options);
 
 }  // namespace tool
 

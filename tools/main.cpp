@@ -35,6 +35,9 @@ void PrintUsage(std::FILE* to) {
       "                               channels, grid, matrix and table sizes (with --json,\n"
       "                               every value: the file --lut-from takes)\n"
       "  edit PROFILE EDIT... [-o OUT]  change tags, then save the profile (to OUT if given)\n"
+      "  picture SRC DST IN OUT       convert a PNG or JPEG image from SRC to DST (both RGB;\n"
+      "                               SRC 'embedded' takes IN's own profile, else sRGB) and\n"
+      "                               write OUT (.png or .jpg) with DST embedded\n"
       "\n"
       "A PROFILE is a file, or one of the built-in profiles:\n",
       to);
@@ -149,7 +152,7 @@ int main(int argc, char** argv) {
   const std::string command = words.front();
   const std::vector<std::string> args(words.begin() + 1, words.end());
   if (command != "info" && command != "convert" && command != "gamut" && command != "list" && command != "tags" &&
-      command != "tag" && command != "edit")
+      command != "tag" && command != "edit" && command != "picture")
     return Usage("unknown command " + command);
   if (options.raw && command != "tag") return Usage("--raw belongs to the tag command");
   if ((!options.edits.empty() || !options.output.empty()) && command != "edit")
@@ -164,6 +167,7 @@ int main(int argc, char** argv) {
     if (command == "tags") return tool::TagsCommand(*session, args, options);
     if (command == "tag") return tool::TagCommand(*session, args, options);
     if (command == "edit") return tool::EditCommand(*session, args, options);
+    if (command == "picture") return tool::PictureCommand(*session, args, options);
     return tool::ListCommand(*session, args, options);
   } catch (const tool::UsageError& e) {
     return Usage(e.what());
