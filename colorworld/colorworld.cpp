@@ -8,6 +8,7 @@
 #include "error_state.h"
 #include "host_bridge.h"
 #include "instance_data.h"
+#include "picture_match.h"
 #include "profile.h"
 
 namespace {
@@ -196,6 +197,9 @@ REALmethodDefinition methods[] = {
     {AsProc(&ConcatColorWorld), nullptr,
      "ConcatColorWorld(keyindex as Integer, p1 as Profile, p2 as Profile, p3 as Profile, p4 as Profile)"},
     {AsProc(&CheckLAB), nullptr, "CheckLAB(L as Double, A as Double, B as Double) as Boolean"},
+    {AsProc(&MatchPicture), nullptr,
+     "MatchPicture(p as Picture, width as Integer, height as Integer, depth as Integer, transparent as Boolean) "
+     "as Picture"},
     {AsProc(&MatchCMcolor), nullptr, "MatchCMcolor(c as CMcolor)"},
 };
 

@@ -14,6 +14,7 @@ extern char LastCMErrorMessage[256];
 // Plugin's own codes.
 constexpr int32_t kErrorInvalidObject = -1;
 constexpr int32_t kErrorSecondStage = -2;
+constexpr int32_t kErrorPictureSize = -3;  // a picture size that is not positive or too large
 constexpr int32_t kErrorFirstProfile = -20;
 constexpr int32_t kErrorSecondProfile = -21;
 constexpr int32_t kErrorNilProfile = -404;

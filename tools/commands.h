@@ -38,6 +38,8 @@ int EditCommand(Session& session, const std::vector<std::string>& args, const Op
 // Profiles in image files: tools/image_commands.cpp
 int EmbedCommand(Session& session, const std::vector<std::string>& args, const Options& options);
 int ExtractCommand(Session& session, const std::vector<std::string>& args, const Options& options);
+// An image file through a colour world: tools/picture_command.cpp
+int PictureCommand(Session& session, const std::vector<std::string>& args, const Options& options);
 
 }  // namespace tool
 

@@ -40,6 +40,9 @@ void PrintUsage(std::FILE* to) {
       "                               embedded, its pixel data copied unchanged; an image\n"
       "                               that carries a profile needs --replace\n"
       "  extract IMAGE -o OUT.icc     write the profile that IMAGE carries to OUT.icc\n"
+      "  picture SRC DST IN OUT       convert a PNG or JPEG image from SRC to DST (both RGB;\n"
+      "                               SRC 'embedded' takes IN's own profile, else sRGB) and\n"
+      "                               write OUT (.png or .jpg) with DST embedded\n"
       "\n"
       "A PROFILE is a file, or one of the built-in profiles:\n",
       to);
@@ -156,7 +159,7 @@ int main(int argc, char** argv) {
   const std::string command = words.front();
   const std::vector<std::string> args(words.begin() + 1, words.end());
   if (command != "info" && command != "convert" && command != "gamut" && command != "list" && command != "tags" &&
-      command != "tag" && command != "edit" && command != "embed" && command != "extract")
+      command != "tag" && command != "edit" && command != "embed" && command != "extract" && command != "picture")
     return Usage("unknown command " + command);
   if (options.raw && command != "tag") return Usage("--raw belongs to the tag command");
   if (!options.edits.empty() && command != "edit")
@@ -176,6 +179,7 @@ int main(int argc, char** argv) {
     if (command == "edit") return tool::EditCommand(*session, args, options);
     if (command == "embed") return tool::EmbedCommand(*session, args, options);
     if (command == "extract") return tool::ExtractCommand(*session, args, options);
+    if (command == "picture") return tool::PictureCommand(*session, args, options);
     return tool::ListCommand(*session, args, options);
   } catch (const tool::UsageError& e) {
     return Usage(e.what());

@@ -79,6 +79,22 @@ TEST_F(PluginTest, RegistersItsClassesAndGlobalsWithTheStoredDeclarations) {
                 "GetDescTypeTag(tag as String) as String", "SetDescTypeTag(tag as String, data as String)"}));
 }
 
+TEST_F(PluginTest, ColorWorldMembersInTheirOrder) {
+  const host::ClassInfo& world = *rt->Classes()[6];
+  ASSERT_EQ(world.name, "ColorWorld");
+  std::vector<std::string> methods;
+  for (const auto& m : world.methods) methods.push_back(m.declaration);
+  EXPECT_EQ(methods,
+            (std::vector<std::string>{
+                "ColorWorld(src as Profile, dest as Profile)", "ColorWorld()",
+                "LinkColorWorld(linkprofile as Profile)",
+                "ConcatColorWorld(keyindex as Integer, p1 as Profile, p2 as Profile, p3 as Profile, p4 as Profile)",
+                "CheckLAB(L as Double, A as Double, B as Double) as Boolean",
+                "MatchPicture(p as Picture, width as Integer, height as Integer, depth as Integer, transparent as "
+                "Boolean) as Picture",
+                "MatchCMcolor(c as CMcolor)"}));
+}
+
 TEST_F(PluginTest, StartsByAnnouncingItsVersionThenRegisters) {
   const auto& resolved = rt->ResolvedEntries();
   ASSERT_GE(resolved.size(), 3u);

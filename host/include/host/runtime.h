@@ -10,6 +10,7 @@
 #define TINTWELL_HOST_RUNTIME_H
 
 #include <cstddef>
+#include <cstdint>
 #include <functional>
 #include <initializer_list>
 #include <memory>
@@ -91,6 +92,22 @@ class Runtime {
   // path (made absolute) and maps it through drive Z:.
   Object MakeFolderItem(const std::string& posixPath);
   std::string FolderItemPath(const Object& item) const;  // the Windows path
+
+  // Pictures: host objects of class Picture holding width x height pixels of 32 bits,
+  // each with a graphics object and a device context drawing on it, as the plugin asks.
+  // Depth is 32, 24, 16 or 8 (stored as 32 bits all the same); a new picture is white.
+  // NewPicture throws HostError for a size or depth the host refuses.
+  struct PictureSize {
+    int width = 0, height = 0, depth = 0;
+  };
+  Object NewPicture(int width, int height, int depth = 32);
+  PictureSize SizeOfPicture(const Object& picture) const;
+  // One pixel as Color (&h00RRGGBB); throws HostError outside the picture.
+  Color GetPixel(const Object& picture, int x, int y) const;
+  void SetPixel(const Object& picture, int x, int y, Color color);
+  // All pixels at once: width x height words &h00RRGGBB, rows top-down; valid while the
+  // picture lives. The top byte of each word is not read.
+  std::uint32_t* PicturePixels(const Object& picture);
 
   // What the plugin registered, in registration order.
   int pluginVersion() const;

@@ -24,13 +24,15 @@ std::shared_ptr<void> HandleTable::Take(HANDLE handle, HandleKind kind) {
   if (it == entries_.end() || it->second.kind != kind) return nullptr;
   std::shared_ptr<void> object = std::move(it->second.object);
   entries_.erase(it);
+  removals_.fetch_add(1, std::memory_order_acq_rel);
   return object;
 }
 
 HandleTable& Handles() {
-  // Destroyed when the library holding it is unloaded, so nothing is left behind.
-  static HandleTable table;
-  return table;
+  // Never destroyed: the table outlives every library that put handles in it, and a
+  // handle left open by a plugin already unloaded must not be released into its code.
+  static HandleTable* table = new HandleTable;
+  return *table;
 }
 
 }  // namespace win32
