@@ -4,13 +4,15 @@
 // would, to the last pixel of the last row, so any byte touched beyond them is caught.
 // Arguments no buffer can back must be refused. A converted image must leave the row
 // padding alone, report its rows to the callback in order, and come out the same when
-// source and destination share a buffer or overlap.
+// source and destination share a buffer or overlap, and with each instruction set the
+// image kernels can use (their vector blocks and scalar tails meet at odd widths).
 #include <algorithm>
 #include <cstdint>
 #include <cstring>
 #include <vector>
 
 #include "fuzz_profiles.h"
+#include "icm/kernels/fast_path.h"
 
 namespace {
 
@@ -171,6 +173,18 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   }
   if (!ok) return 0;
   fuzz::Check(!callback || width == 0 || height == 0 || progress.done == height);
+  if (layout & 16) {
+    using win32::icm::kernels::Isa;
+    for (Isa isa : {Isa::Scalar, Isa::Sse2}) {
+      if (!win32::icm::kernels::IsaAvailable(isa)) continue;
+      fuzz::Bytes again(dst_before);
+      win32::icm::kernels::ForceIsa(isa);
+      const BOOL same_ok = TranslateBitmapBits(x, src.data(), fin.format, width, height, in_given, again.data(),
+                                               fout.format, out_given, nullptr, 0);
+      win32::icm::kernels::ForceIsa(Isa::Avx2);
+      fuzz::Check(same_ok && again == dst);
+    }
+  }
   if (!(layout & 2) || in_extent == 0) return 0;
 
   // The same conversion with both images in one block: the same buffer, or the output

@@ -1,5 +1,7 @@
-// TranslateBitmapBits: 8-bit RGB, gray and CMYK layouts through one Little CMS image
-// transform per format pair, made once per colour transform and shared by threads.
+// TranslateBitmapBits: 8-bit RGB, gray and CMYK layouts. The work is done by the
+// image kernels (icm/kernels/) from tables made once per colour transform; a chain they
+// do not cover goes through one Little CMS image transform per format pair, also made
+// once and shared by threads.
 //
 // Byte order in memory: BM_RGBTRIPLETS B,G,R; BM_BGRTRIPLETS R,G,B; BM_xRGBQUADS
 // B,G,R,x; BM_xBGRQUADS R,G,B,x; BM_KYMCQUADS C,M,Y,K; BM_CMYKQUADS K,Y,M,C; BM_GRAY one
@@ -20,6 +22,7 @@
 #include <thread>
 #include <vector>
 
+#include "icm/kernels/fast_path.h"
 #include "icm/transform.h"
 
 namespace win32::icm {
@@ -36,16 +39,17 @@ struct Layout {
   cmsColorSpaceSignature space;
   unsigned bytes;
   bool x;  // a filler byte after the colour
+  kernels::PixelLayout pixel;
 };
 
 constexpr Layout kLayouts[] = {
-    {BM_RGBTRIPLETS, TYPE_BGR_8, cmsSigRgbData, 3, false},
-    {BM_BGRTRIPLETS, TYPE_RGB_8, cmsSigRgbData, 3, false},
-    {BM_xRGBQUADS, TYPE_BGRA_8, cmsSigRgbData, 4, true},
-    {BM_xBGRQUADS, TYPE_RGBA_8, cmsSigRgbData, 4, true},
-    {BM_GRAY, TYPE_GRAY_8, cmsSigGrayData, 1, false},
-    {BM_KYMCQUADS, TYPE_CMYK_8, cmsSigCmykData, 4, false},
-    {BM_CMYKQUADS, TYPE_KYMC_8, cmsSigCmykData, 4, false},
+    {BM_RGBTRIPLETS, TYPE_BGR_8, cmsSigRgbData, 3, false, {3, {2, 1, 0, 0}, -1}},
+    {BM_BGRTRIPLETS, TYPE_RGB_8, cmsSigRgbData, 3, false, {3, {0, 1, 2, 0}, -1}},
+    {BM_xRGBQUADS, TYPE_BGRA_8, cmsSigRgbData, 4, true, {4, {2, 1, 0, 0}, 3}},
+    {BM_xBGRQUADS, TYPE_RGBA_8, cmsSigRgbData, 4, true, {4, {0, 1, 2, 0}, 3}},
+    {BM_GRAY, TYPE_GRAY_8, cmsSigGrayData, 1, false, {1, {0, 0, 0, 0}, -1}},
+    {BM_KYMCQUADS, TYPE_CMYK_8, cmsSigCmykData, 4, false, {4, {0, 1, 2, 3}, -1}},
+    {BM_CMYKQUADS, TYPE_KYMC_8, cmsSigCmykData, 4, false, {4, {3, 2, 1, 0}, -1}},
 };
 
 // Every other BMFORMAT the SDK names; known, but not converted here.
@@ -77,27 +81,40 @@ bool ResolveStride(DWORD width, unsigned bytes, DWORD given, uint64_t& stride) {
   return stride >= row && stride <= 0xFFFFFFFFu;
 }
 
+// One call's pixels. Work is handed out as runs of pixels counted from the first pixel
+// of the image, so a share may start or end inside a row.
 struct Job {
+  const kernels::FastPath* fast;  // null: the Little CMS transform below
   cmsHTRANSFORM transform;
+  const Layout* in;
+  const Layout* out;
   const uint8_t* src;
   uint8_t* dst;
   size_t width;
   size_t in_stride;
   size_t out_stride;
-  size_t out_bytes;
   bool zero_x;  // quads out of a layout without x: write 0 there
 
-  void Rows(size_t first, size_t count) const {
-    if (count == 0) return;
-    cmsDoTransformLineStride(transform, src + first * in_stride, dst + first * out_stride,
-                             static_cast<cmsUInt32Number>(width), static_cast<cmsUInt32Number>(count),
-                             static_cast<cmsUInt32Number>(in_stride), static_cast<cmsUInt32Number>(out_stride), 0,
-                             0);
+  void Run(size_t row, size_t x0, size_t count) const {
+    const uint8_t* s = src + row * in_stride + x0 * in->bytes;
+    uint8_t* d = dst + row * out_stride + x0 * out->bytes;
+    if (fast) {
+      kernels::Run(*fast, s, in->pixel, d, out->pixel, count);
+      return;
+    }
+    cmsDoTransform(transform, s, d, static_cast<cmsUInt32Number>(count));
     if (zero_x) {
-      for (size_t r = first; r < first + count; ++r) {
-        uint8_t* row = dst + r * out_stride;
-        for (size_t i = 0; i < width; ++i) row[i * out_bytes + 3] = 0;
-      }
+      for (size_t i = 0; i < count; ++i) d[i * out->bytes + 3] = 0;
+    }
+  }
+
+  // Pixels [first, last) of the image.
+  void Pixels(size_t first, size_t last) const {
+    while (first < last) {
+      const size_t row = first / width, x0 = first % width;
+      const size_t count = std::min(width - x0, last - first);
+      Run(row, x0, count);
+      first += count;
     }
   }
 };
@@ -146,9 +163,6 @@ extern "C" BOOL WINAPI TranslateBitmapBits(HTRANSFORM hColorTransform, PVOID pSr
     const uint64_t out_extent = (uint64_t{dwHeight} - 1) * out_stride + uint64_t{dwWidth} * out->bytes;
     if (in_extent > PTRDIFF_MAX || out_extent > PTRDIFF_MAX) return Fail(ERROR_INVALID_PARAMETER);
 
-    cmsHTRANSFORM x = t->Bitmap(in->lcms, out->lcms, error);
-    if (!x) return Fail(error);
-
     const auto* src = static_cast<const uint8_t*>(pSrcBits);
     auto* dst = static_cast<uint8_t*>(pDestBits);
     const uintptr_t s0 = reinterpret_cast<uintptr_t>(src), d0 = reinterpret_cast<uintptr_t>(dst);
@@ -162,30 +176,44 @@ extern "C" BOOL WINAPI TranslateBitmapBits(HTRANSFORM hColorTransform, PVOID pSr
       copy.assign(src, src + in_extent);
       src = copy.data();
     }
-    const Job job{x, src, dst, dwWidth, static_cast<size_t>(in_stride), static_cast<size_t>(out_stride),
-                  out->bytes, out->x && !in->x};
+    Job job{t->FastPath(), nullptr, in, out, src, dst, dwWidth, static_cast<size_t>(in_stride),
+                  static_cast<size_t>(out_stride), out->x && !in->x};
+    if (!job.fast) {
+      job.transform = t->Bitmap(in->lcms, out->lcms, error);
+      if (!job.transform) return Fail(error);
+    }
 
-    const size_t height = dwHeight;
-    const unsigned workers = Workers(size_t{dwWidth} * height);
-    const size_t band = std::max<size_t>(1, kBandPixels / dwWidth);
+    const size_t width = dwWidth, height = dwHeight;
+    const unsigned workers = Workers(width * height);
+    // Shares split rows only where no share can write bytes another still has to
+    // read: out of place, or pixels of one size converted in place.
+    const bool split_rows = !in_place || in->bytes == out->bytes;
+    const size_t band = std::max<size_t>(1, kBandPixels / width);
     for (size_t first = 0; first < height; first += band) {
       const size_t rows = std::min(band, height - first);
+      const size_t begin = first * width, end = (first + rows) * width;
       if (workers == 1) {
-        job.Rows(first, rows);
+        job.Pixels(begin, end);
       } else {
+        // Equal shares of pixels, cut at row ends unless rows may be split.
+        std::vector<size_t> cut(workers + 1);
+        for (unsigned w = 0; w <= workers; ++w) {
+          size_t at = begin + (end - begin) * w / workers;
+          if (!split_rows) at = std::min(end, (at + width / 2) / width * width);
+          cut[w] = std::max(at, w ? cut[w - 1] : begin);
+        }
+        cut[workers] = end;
         std::vector<std::thread> pool;
         pool.reserve(workers);  // no reallocation once threads run
-        const size_t share = (rows + workers - 1) / workers;
         for (unsigned w = 1; w < workers; ++w) {
-          const size_t begin = std::min(rows, w * share);
-          const size_t count = std::min(share, rows - begin);
+          if (cut[w] == cut[w + 1]) continue;
           try {
-            pool.emplace_back([&job, first, begin, count] { job.Rows(first + begin, count); });
+            pool.emplace_back([&job, from = cut[w], to = cut[w + 1]] { job.Pixels(from, to); });
           } catch (const std::system_error&) {
-            job.Rows(first + begin, count);  // no thread to spare: do this share here
+            job.Pixels(cut[w], cut[w + 1]);  // no thread to spare: do this share here
           }
         }
-        job.Rows(first, std::min(share, rows));
+        job.Pixels(cut[0], cut[1]);
         for (std::thread& th : pool) th.join();
       }
       if (pfnCallBack && !pfnCallBack(dwHeight, static_cast<ULONG>(first + rows), ulCallbackData)) {

@@ -13,6 +13,7 @@
 #include "handle_table.h"
 #include "icm/color_codec.h"
 #include "icm/gamut.h"
+#include "icm/kernels/fast_path.h"
 #include "icm/profile_store.h"
 
 namespace win32::icm {
@@ -196,6 +197,15 @@ cmsHTRANSFORM Transform::Bitmap(cmsUInt32Number in_format, cmsUInt32Number out_f
   }
   bitmaps_.emplace(key, x);
   return x;
+}
+
+const kernels::FastPath* Transform::FastPath() {
+  std::lock_guard<std::mutex> lock(mutex_);
+  if (!fast_made_) {
+    fast_ = kernels::Build(*chain_, colors_);
+    fast_made_ = true;
+  }
+  return fast_.get();
 }
 
 const GamutCheck* Transform::Gamut(DWORD& error) {

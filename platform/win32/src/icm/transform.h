@@ -19,6 +19,9 @@
 namespace win32::icm {
 
 class GamutCheck;
+namespace kernels {
+struct FastPath;
+}
 
 // How one profile of a chain is used: the space it reads and the space it writes.
 struct ChainStep {
@@ -54,6 +57,8 @@ class Chain {
   cmsContext context() const { return context_; }
   const std::vector<cmsHPROFILE>& profiles() const { return profiles_; }
   const std::vector<ChainStep>& steps() const { return steps_; }
+  // One intent per profile, as handed to Little CMS.
+  const std::vector<cmsUInt32Number>& intents() const { return intents_; }
   cmsColorSpaceSignature input() const { return steps_.front().in; }
   cmsColorSpaceSignature output() const { return steps_.back().out; }
   // A named-colour profile first: the input is a 1-based index below named_count() + 1.
@@ -88,6 +93,9 @@ class Transform {
   cmsHTRANSFORM colors() const { return colors_; }
   // An 8-bit image transform for these formats, made once and shared by threads.
   cmsHTRANSFORM Bitmap(cmsUInt32Number in_format, cmsUInt32Number out_format, DWORD& error);
+  // The 8-bit image kernels' tables for this chain, made on first use; null when none
+  // fit (the Little CMS image transforms then do the work).
+  const kernels::FastPath* FastPath();
   // The gamut checker of the last profile, made on first use.
   const GamutCheck* Gamut(DWORD& error);
   // The chain without its last profile, on to Lab (double), made on first use.
@@ -99,6 +107,8 @@ class Transform {
   std::mutex mutex_;  // guards what is made on first use
   std::map<std::pair<cmsUInt32Number, cmsUInt32Number>, cmsHTRANSFORM> bitmaps_;
   std::unique_ptr<GamutCheck> gamut_;
+  std::unique_ptr<kernels::FastPath> fast_;
+  bool fast_made_ = false;
   bool gamut_made_ = false;
   cmsHTRANSFORM to_last_lab_ = nullptr;
 };

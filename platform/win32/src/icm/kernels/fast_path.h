@@ -1,0 +1,117 @@
+// Own 8-bit image kernels behind TranslateBitmapBits. A fast path is made once per
+// colour transform from what Little CMS says about its chain, and then converts runs of
+// pixels in any of the 8-bit layouts:
+//   - gray input: a table of the exact result for each of the 256 levels;
+//   - matrix-shaper chains (RGB -> RGB, RGB -> gray): per-channel linearisation folded
+//     into the 3x3 matrix, then a dense output table indexed by the square root of the
+//     linear value (fine steps near black, where output curves are steepest), read with
+//     linear interpolation;
+//   - everything else (RGB or CMYK in): the whole chain sampled in double precision on
+//     a grid, read with tetrahedral (3 inputs) or 4-D simplex (CMYK) interpolation in
+//     fixed point. A CMYK grid is spaced along the input curves of the first profile's
+//     table where it has them.
+// Every instruction set (portable scalar, SSE2, AVX2) computes the same integers and
+// the same float operations in the same order, so all give identical bytes.
+#ifndef TINTWELL_WIN32_ICM_KERNELS_FAST_PATH_H
+#define TINTWELL_WIN32_ICM_KERNELS_FAST_PATH_H
+
+#include <lcms2.h>
+
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+#include <vector>
+
+// The x86 kernels need SSE2 from the compiler (every x86-64 target has it); the AVX2
+// kernel is compiled for its own functions and chosen at run time.
+#if defined(__x86_64__) || (defined(__i386__) && defined(__SSE2__))
+#define TINTWELL_KERNELS_X86 1
+#endif
+
+namespace win32::icm {
+class Chain;
+}
+
+namespace win32::icm::kernels {
+
+// Where the colour channels of one pixel sit in memory, in the chain's channel order
+// (R,G,B; gray; C,M,Y,K).
+struct PixelLayout {
+  unsigned bytes;      // 1, 3 or 4 bytes a pixel
+  std::uint8_t at[4];  // byte offset of each channel
+  int x;               // offset of the filler byte; -1 when there is none
+};
+
+enum class Kind { Table1, Matrix, Clut3, Clut4 };
+enum class Isa { Scalar, Sse2, Avx2 };
+
+// Output tables of the matrix-shaper path: entries over u = sqrt(linear) in [0, 1].
+constexpr unsigned kShaperSteps = 4096;
+// Grid points per axis of the sampled chains.
+constexpr unsigned kGrid3 = 52;
+constexpr unsigned kGrid4 = 17;
+// Fixed point: grid and table values carry 7 fractional bits of an output level (255
+// fits a signed 16-bit lane), interpolation weights 14 bits.
+constexpr int kValueBits = 7;
+constexpr int kWeightBits = 14;
+
+struct FastPath {
+  Kind kind = Kind::Table1;
+  unsigned in_channels = 0;
+  unsigned out_channels = 0;
+
+  // Table1: 256 entries of out_channels bytes.
+  std::vector<std::uint8_t> table;
+
+  // Matrix: lin[c][v] is column c of the matrix times the linearised level v, as
+  // four floats (the last unused), scaled so that the square root lands on the output
+  // tables' fixed-point index; the offset is folded into channel 0.
+  std::vector<float> lin;         // 3 * 256 * 4
+  float limit = 0;                // clamp for the scaled linear value
+  std::vector<std::uint16_t> shaper;  // out_channels * (kShaperSteps + 2)
+
+  // Clut3 / Clut4: nodes of out_channels signed 16-bit values (padded at the end so
+  // any node can be read as 8 bytes), and per input level its node offset on each
+  // axis and its weight within the cell.
+  unsigned grid = 0;
+  std::vector<std::int16_t> nodes;
+  std::vector<std::int32_t> offset;  // in_channels * 256, in int16 units
+  std::vector<std::int32_t> stride;  // in_channels
+  std::vector<std::int16_t> weight;  // in_channels * 256
+
+  // Milliseconds spent building, for the benchmark's report.
+  double build_ms = 0;
+};
+
+// The fast path for a chain whose double-precision transform (device values 0..1 in
+// and out) is `exact`; null when the chain's ends are not 8-bit bitmap spaces. Sampling
+// runs through Little CMS and can take tens of milliseconds: callers cache the result.
+std::unique_ptr<FastPath> Build(const Chain& chain, cmsHTRANSFORM exact);
+
+// Converts n pixels from src to dst. The x byte of an output with one is copied from
+// an input with one, and 0 otherwise. dst may be src when the output pixel is no larger
+// than the input pixel: every pixel is read before it or any later one is written.
+void Run(const FastPath& path, const std::uint8_t* src, const PixelLayout& in, std::uint8_t* dst,
+         const PixelLayout& out, std::size_t n);
+
+// The instruction set Run uses: the best this CPU has, unless capped by ForceIsa (for
+// tests and benchmarks; a cap above what the CPU has is lowered).
+Isa ActiveIsa();
+void ForceIsa(Isa cap);
+bool IsaAvailable(Isa isa);
+
+// One kernel per instruction set; Run picks among them.
+namespace detail {
+void RunScalar(const FastPath& path, const std::uint8_t* src, const PixelLayout& in, std::uint8_t* dst,
+               const PixelLayout& out, std::size_t n);
+#ifdef TINTWELL_KERNELS_X86
+void RunSse2(const FastPath& path, const std::uint8_t* src, const PixelLayout& in, std::uint8_t* dst,
+             const PixelLayout& out, std::size_t n);
+void RunAvx2(const FastPath& path, const std::uint8_t* src, const PixelLayout& in, std::uint8_t* dst,
+             const PixelLayout& out, std::size_t n);
+#endif
+}  // namespace detail
+
+}  // namespace win32::icm::kernels
+
+#endif

@@ -1,0 +1,95 @@
+// Per-pixel steps shared by every kernel: the vector kernels use them for the pixels
+// at the end of a run, so each pixel gets the same bytes whichever kernel reads it.
+#ifndef TINTWELL_WIN32_ICM_KERNELS_PIXEL_OPS_H
+#define TINTWELL_WIN32_ICM_KERNELS_PIXEL_OPS_H
+
+#include <cmath>
+#include <cstdint>
+
+#include "icm/kernels/fast_path.h"
+
+namespace win32::icm::kernels::ops {
+
+inline std::uint8_t FillerOf(const std::uint8_t* s, const PixelLayout& in) { return in.x >= 0 ? s[in.x] : 0; }
+
+// Output table k read at the scaled linear value v (already clamped to 0..limit).
+inline std::uint8_t Shape(const FastPath& p, unsigned k, float v) {
+  const auto q = static_cast<std::uint32_t>(static_cast<std::int32_t>(std::sqrt(v)));
+  const std::uint16_t* t = &p.shaper[k * (kShaperSteps + 2) + (q >> 8)];
+  const std::uint32_t f = q & 255;
+  return static_cast<std::uint8_t>((t[0] * (256 - f) + t[1] * f + (1u << (kValueBits + 7))) >> (kValueBits + 8));
+}
+
+inline void MatrixPixel(const FastPath& p, const std::uint8_t* s, const PixelLayout& in, std::uint8_t* d,
+                        const PixelLayout& out) {
+  const float* a = &p.lin[s[in.at[0]] * 4];
+  const float* b = &p.lin[(256 + s[in.at[1]]) * 4];
+  const float* c = &p.lin[(512 + s[in.at[2]]) * 4];
+  const std::uint8_t x = FillerOf(s, in);
+  std::uint8_t o[3];
+  for (unsigned k = 0; k < p.out_channels; ++k) {
+    float v = (a[k] + b[k]) + c[k];
+    v = v > 0.0f ? v : 0.0f;
+    v = v < p.limit ? v : p.limit;
+    o[k] = Shape(p, k, v);
+  }
+  for (unsigned k = 0; k < p.out_channels; ++k) d[out.at[k]] = o[k];
+  if (out.x >= 0) d[out.x] = x;
+}
+
+// The corners of the simplex holding a point and the weights of its steps: the axes
+// sorted by weight, largest first (ties by axis order, so the ranks are a permutation).
+template <unsigned N>
+struct Simplex {
+  std::int32_t step[N];  // node offset of each step along the sorted axes
+  std::int32_t w[N];     // sorted weights
+};
+
+template <unsigned N>
+inline Simplex<N> Sort(const std::int32_t* w, const std::int32_t* s) {
+  Simplex<N> r;
+  for (unsigned i = 0; i < N; ++i) {
+    unsigned rank = 0;
+    for (unsigned j = 0; j < N; ++j) rank += j < i ? (w[j] >= w[i]) : (w[j] > w[i]);
+    r.w[rank] = w[i];
+    r.step[rank] = s[i];
+  }
+  return r;
+}
+
+template <unsigned N>
+inline void ClutPixel(const FastPath& p, const std::uint8_t* s, const PixelLayout& in, std::uint8_t* d,
+                      const PixelLayout& out) {
+  std::int32_t w[N], st[N], base = 0;
+  for (unsigned a = 0; a < N; ++a) {
+    const std::uint8_t v = s[in.at[a]];
+    base += p.offset[a * 256 + v];
+    w[a] = p.weight[a * 256 + v];
+    st[a] = p.stride[a];
+  }
+  const std::uint8_t x = FillerOf(s, in);
+  const Simplex<N> sx = Sort<N>(w, st);
+  const std::int16_t* c[N + 1];
+  c[0] = &p.nodes[base];
+  for (unsigned i = 0; i < N; ++i) c[i + 1] = c[i] + sx.step[i];
+  std::uint8_t o[4];
+  for (unsigned k = 0; k < p.out_channels; ++k) {
+    std::int32_t sum = c[0][k] * (1 << kWeightBits);
+    for (unsigned i = 0; i < N; ++i) sum += (c[i + 1][k] - c[i][k]) * sx.w[i];
+    o[k] = static_cast<std::uint8_t>((sum + (1 << (kWeightBits + kValueBits - 1))) >> (kWeightBits + kValueBits));
+  }
+  for (unsigned k = 0; k < p.out_channels; ++k) d[out.at[k]] = o[k];
+  if (out.x >= 0) d[out.x] = x;
+}
+
+inline void Table1Pixel(const FastPath& p, const std::uint8_t* s, const PixelLayout& in, std::uint8_t* d,
+                        const PixelLayout& out) {
+  const std::uint8_t* t = &p.table[s[in.at[0]] * p.out_channels];
+  const std::uint8_t x = FillerOf(s, in);
+  for (unsigned k = 0; k < p.out_channels; ++k) d[out.at[k]] = t[k];
+  if (out.x >= 0) d[out.x] = x;
+}
+
+}  // namespace win32::icm::kernels::ops
+
+#endif
