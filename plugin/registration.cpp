@@ -5,11 +5,13 @@
 #include "cmcolor.h"
 #include "colorworld.h"
 #include "debugger.h"
+#include "discovery.h"
 #include "error_state.h"
 #include "host_bridge.h"
 #include "matrix.h"
 #include "profile.h"
 #include "vector.h"
+#include "vector_f.h"
 #include "vector_nc.h"
 
 namespace {
@@ -21,6 +23,7 @@ REALclassDefinition* const kClasses[] = {
     &MatrixClass,
     &VectorClass,
     &VectorNCClass,
+    &VectorFClass,
     &CMColorClass,
     &ProfileClass,
     &ColorWorldClass,
@@ -31,11 +34,28 @@ REALclassDefinition* const kClasses[] = {
 REALmethodDefinition globalMethods[] = {
     {AsProc(&halvoRegisterDebugger), nullptr, "halvoRegisterDebugger(debugger as halvoDebugger)"},
     {AsProc(&halvoUnregisterDebugger), nullptr, "halvoUnregisterDebugger()"},
+    {AsProc(&GetSystemProfile), nullptr, "GetSystemProfile() as Profile"},
     {AsProc(&CMError), nullptr, "CMError() as Integer"},
     {AsProc(&CMErrorMessage), nullptr, "CMErrorMessage() as string"},
+    {AsProc(&TintwellVersion), nullptr, "TintwellVersion() as Integer"},
+    {AsProc(&GetProfileByUse), nullptr, "GetProfileByUse(use as String) as Profile"},
+    {AsProc(&TintwellFolder), nullptr, "TintwellFolder() as Folderitem"},
+    {AsProc(&CMMcount), nullptr, "CMMcount() as Integer"},
+    {AsProc(&getProfileBySpace), nullptr, "getProfileBySpace(theSpace as String) as Profile"},
+    {AsProc(&GetMonitorProfile), nullptr, "GetMonitorProfile() as Profile"},
+    {AsProc(&CreateProfileIdentifier), nullptr,
+     "CreateProfileIdentifier(p as profile, ident as Integer, size as Integer) as Integer"},
+    {AsProc(&NewLinkProfile), nullptr,
+     "NewLinkProfile(f as folderitem, keyindex as Integer, p1 as Profile, p2 as Profile, p3 as Profile, p4 as "
+     "Profile) as Profile"},
     {AsProc(&NewConcatColorWorld), nullptr,
      "NewConcatColorWorld(keyindex as Integer, p1 as Profile, p2 as Profile, p3 as Profile, p4 as Profile) as "
      "ColorWorld"},
+    {AsProc(&CopyProfile), nullptr, "CopyProfile(f as folderitem, p as Profile) as Profile"},
+    {AsProc(&BlankProfile), nullptr, "BlankProfile(f as folderitem) as Profile"},
+    {AsProc(&ProfileSearch), nullptr,
+     "ProfileSearch(cmm as String, aClass as String, dataspace as String, connectspace as String, manufacturer as "
+     "String, model as Integer, profiles as VectorF)"},
 };
 
 }  // namespace

@@ -17,6 +17,12 @@ struct Edit {
   std::string tag;    // LutFrom: the tag to write
 };
 
+// search: the header values a profile must hold; empty (or a model of 0) is no criterion.
+struct SearchCriteria {
+  std::string cmm, deviceClass, space, pcs, manufacturer;
+  int model = 0;
+};
+
 struct Options {
   bool json = false;
   int intent = -1;                // rendering intent for source and destination; -1 keeps theirs
@@ -24,6 +30,7 @@ struct Options {
   bool raw = false;               // tag: the bytes as a hex dump
   std::vector<Edit> edits;        // edit: the changes
   std::string output;             // edit: save here instead of in place
+  SearchCriteria search;          // search: the criteria
 };
 
 int ListCommand(Session& session, const std::vector<std::string>& args, const Options& options);
@@ -34,6 +41,11 @@ int GamutCommand(Session& session, const std::vector<std::string>& args, const O
 int TagsCommand(Session& session, const std::vector<std::string>& args, const Options& options);
 int TagCommand(Session& session, const std::vector<std::string>& args, const Options& options);
 int EditCommand(Session& session, const std::vector<std::string>& args, const Options& options);
+// Finding and making profiles: tools/discovery_commands.cpp
+int SearchCommand(Session& session, const std::vector<std::string>& args, const Options& options);
+int LinkCommand(Session& session, const std::vector<std::string>& args, const Options& options);
+int BlankCommand(Session& session, const std::vector<std::string>& args, const Options& options);
+int CopyCommand(Session& session, const std::vector<std::string>& args, const Options& options);
 
 }  // namespace tool
 

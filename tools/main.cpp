@@ -35,6 +35,11 @@ void PrintUsage(std::FILE* to) {
       "                               channels, grid, matrix and table sizes (with --json,\n"
       "                               every value: the file --lut-from takes)\n"
       "  edit PROFILE EDIT... [-o OUT]  change tags, then save the profile (to OUT if given)\n"
+      "  search [CRITERIA]            the profiles in the colour directory whose header\n"
+      "                               holds every criterion given, with class and description\n"
+      "  link OUT P1 P2 [P3 P4]       write the device link of the chain P1..P4 to OUT\n"
+      "  blank OUT                    write a blank RGB display profile to OUT\n"
+      "  copy SRC OUT                 copy the profile SRC to OUT\n"
       "\n"
       "A PROFILE is a file, or one of the built-in profiles:\n",
       to);
@@ -47,8 +52,9 @@ void PrintUsage(std::FILE* to) {
       "profile takes indexes from 1. Other values are refused.\n"
       "\n"
       "Options:\n"
-      "  --intent N      rendering intent of source and destination (0 perceptual,\n"
-      "                  1 relative colorimetric, 2 saturation, 3 absolute colorimetric)\n"
+      "  --intent N      rendering intent of source and destination, or of every\n"
+      "                  profile of a link (0 perceptual, 1 relative colorimetric,\n"
+      "                  2 saturation, 3 absolute colorimetric)\n"
       "  --via PROFILE   a profile between source and destination (up to two)\n"
       "  --json          machine-readable output\n"
       "  --raw           tag: the tag's bytes as a hex dump\n"
@@ -70,6 +76,11 @@ void PrintUsage(std::FILE* to) {
       "  -o OUT               save the edited profile as OUT; without it the profile's\n"
       "                       own file is replaced\n"
       "A tag signature of fewer than 4 characters is padded with spaces ('XYZ').\n"
+      "\n"
+      "Search criteria (search command), signatures padded as tags are:\n"
+      "  --cmm X  --class X  --space X  --pcs X  --manufacturer X   header signatures\n"
+      "  --model N            the device model, a whole number above 0\n"
+      "The colour directory is $XDG_DATA_HOME/icc (default ~/.local/share/icc).\n"
       "\n"
       "Exit status: 0 success, 1 a failed job, 2 a usage error.\n",
       to);
@@ -104,6 +115,7 @@ int main(int argc, char** argv) {
   tool::Options options;
   std::string pluginPath = DefaultPluginPath();
   bool verbose = false;
+  bool searchGiven = false;
   std::vector<std::string> words;
   for (int i = 1; i < argc; ++i) {
     const std::string arg = argv[i];
@@ -126,6 +138,28 @@ int main(int argc, char** argv) {
       if (i + 2 >= argc) return Usage("--lut-from needs a JSON file and a tag signature");
       options.edits.push_back({tool::Edit::LutFrom, argv[i + 1], argv[i + 2]});
       i += 2;
+    } else if (arg == "--cmm" || arg == "--class" || arg == "--space" || arg == "--pcs" || arg == "--manufacturer" ||
+               arg == "--model") {
+      if (i + 1 >= argc) return Usage(arg + " needs a value");
+      const std::string v = argv[++i];
+      if (arg == "--model") {
+        char* end = nullptr;
+        const long model = std::strtol(v.c_str(), &end, 10);
+        if (v.empty() || *end != '\0' || model < 1 || model > INT_MAX) return Usage("--model takes a whole number above 0");
+        options.search.model = static_cast<int>(model);
+        searchGiven = true;
+        continue;
+      }
+      bool printable = !v.empty() && v.size() <= 4;
+      for (unsigned char c : v) printable = printable && c >= 0x20 && c < 0x7F;
+      if (!printable) return Usage(arg + " takes a signature of 1 to 4 printable characters");
+      const std::string padded = v + std::string(4 - v.size(), ' ');
+      if (arg == "--cmm") options.search.cmm = padded;
+      if (arg == "--class") options.search.deviceClass = padded;
+      if (arg == "--space") options.search.space = padded;
+      if (arg == "--pcs") options.search.pcs = padded;
+      if (arg == "--manufacturer") options.search.manufacturer = padded;
+      searchGiven = true;
     } else if (arg == "--verbose") {
       verbose = true;
     } else if (arg == "--plugin" || arg == "--via" || arg == "--intent") {
@@ -149,9 +183,12 @@ int main(int argc, char** argv) {
   const std::string command = words.front();
   const std::vector<std::string> args(words.begin() + 1, words.end());
   if (command != "info" && command != "convert" && command != "gamut" && command != "list" && command != "tags" &&
-      command != "tag" && command != "edit")
+      command != "tag" && command != "edit" && command != "search" && command != "link" && command != "blank" &&
+      command != "copy")
     return Usage("unknown command " + command);
   if (options.raw && command != "tag") return Usage("--raw belongs to the tag command");
+  if (searchGiven && command != "search")
+    return Usage("--cmm, --class, --space, --pcs, --manufacturer and --model belong to the search command");
   if ((!options.edits.empty() || !options.output.empty()) && command != "edit")
     return Usage("--desc, --copyright, --remove, --copy-tag, --lut-from and -o belong to the edit command");
 
@@ -164,6 +201,10 @@ int main(int argc, char** argv) {
     if (command == "tags") return tool::TagsCommand(*session, args, options);
     if (command == "tag") return tool::TagCommand(*session, args, options);
     if (command == "edit") return tool::EditCommand(*session, args, options);
+    if (command == "search") return tool::SearchCommand(*session, args, options);
+    if (command == "link") return tool::LinkCommand(*session, args, options);
+    if (command == "blank") return tool::BlankCommand(*session, args, options);
+    if (command == "copy") return tool::CopyCommand(*session, args, options);
     return tool::ListCommand(*session, args, options);
   } catch (const tool::UsageError& e) {
     return Usage(e.what());
