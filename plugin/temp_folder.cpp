@@ -1,5 +1,7 @@
 #include "temp_folder.h"
 
+#include "blank_template.h"
+
 #include <cstdio>
 #include <cstring>
 
@@ -129,6 +131,7 @@ void SetUpTempFolder() {
   SweepAbandonedFolders();
   // Started again in the same process: the folder claimed before is still ours.
   if (WorkingFolderLock == INVALID_HANDLE_VALUE && !ClaimWorkingFolder()) WorkingFolderPath[0] = '\0';
+  PlaceBlankTemplate(TempFolderPath, WorkingFolderPath);
   SetLastError(ERROR_SUCCESS);  // what start-up met is nobody's error
 }
 

@@ -17,6 +17,12 @@ struct Edit {
   std::string tag;    // LutFrom: the tag to write
 };
 
+// search: the header values a profile must hold; empty (or a model of 0) is no criterion.
+struct SearchCriteria {
+  std::string cmm, deviceClass, space, pcs, manufacturer;
+  int model = 0;
+};
+
 struct Options {
   bool json = false;
   int intent = -1;                // rendering intent for source and destination; -1 keeps theirs
@@ -25,6 +31,7 @@ struct Options {
   std::vector<Edit> edits;        // edit: the changes
   std::string output;             // edit: save here instead of in place; embed, extract: the file made
   bool replace = false;           // embed: replace a profile the image already carries
+  SearchCriteria search;          // search: the criteria
 };
 
 int ListCommand(Session& session, const std::vector<std::string>& args, const Options& options);
@@ -40,6 +47,11 @@ int EmbedCommand(Session& session, const std::vector<std::string>& args, const O
 int ExtractCommand(Session& session, const std::vector<std::string>& args, const Options& options);
 // An image file through a colour world: tools/picture_command.cpp
 int PictureCommand(Session& session, const std::vector<std::string>& args, const Options& options);
+// Finding and making profiles: tools/discovery_commands.cpp
+int SearchCommand(Session& session, const std::vector<std::string>& args, const Options& options);
+int LinkCommand(Session& session, const std::vector<std::string>& args, const Options& options);
+int BlankCommand(Session& session, const std::vector<std::string>& args, const Options& options);
+int CopyCommand(Session& session, const std::vector<std::string>& args, const Options& options);
 
 }  // namespace tool
 

@@ -2,6 +2,7 @@
 // through the plugin's registered classes and methods, via the host runtime.
 #include <unistd.h>
 
+#include <algorithm>
 #include <climits>
 #include <cstdio>
 #include <cstdlib>
@@ -43,6 +44,11 @@ void PrintUsage(std::FILE* to) {
       "  picture SRC DST IN OUT       convert a PNG or JPEG image from SRC to DST (both RGB;\n"
       "                               SRC 'embedded' takes IN's own profile, else sRGB) and\n"
       "                               write OUT (.png or .jpg) with DST embedded\n"
+      "  search [CRITERIA]            the profiles in the colour directory whose header\n"
+      "                               holds every criterion given, with class and description\n"
+      "  link OUT P1 P2 [P3 P4]       write the device link of the chain P1..P4 to OUT\n"
+      "  blank OUT                    write a blank RGB display profile to OUT\n"
+      "  copy SRC OUT                 copy the profile SRC to OUT\n"
       "\n"
       "A PROFILE is a file, or one of the built-in profiles:\n",
       to);
@@ -55,8 +61,9 @@ void PrintUsage(std::FILE* to) {
       "profile takes indexes from 1. Other values are refused.\n"
       "\n"
       "Options:\n"
-      "  --intent N      rendering intent of source and destination (0 perceptual,\n"
-      "                  1 relative colorimetric, 2 saturation, 3 absolute colorimetric)\n"
+      "  --intent N      rendering intent of source and destination, or of every\n"
+      "                  profile of a link (0 perceptual, 1 relative colorimetric,\n"
+      "                  2 saturation, 3 absolute colorimetric)\n"
       "  --via PROFILE   a profile between source and destination (up to two)\n"
       "  --json          machine-readable output\n"
       "  --raw           tag: the tag's bytes as a hex dump\n"
@@ -78,6 +85,11 @@ void PrintUsage(std::FILE* to) {
       "  -o OUT               save the edited profile as OUT; without it the profile's\n"
       "                       own file is replaced\n"
       "A tag signature of fewer than 4 characters is padded with spaces ('XYZ').\n"
+      "\n"
+      "Search criteria (search command), signatures padded as tags are:\n"
+      "  --cmm X  --class X  --space X  --pcs X  --manufacturer X   header signatures\n"
+      "  --model N            the device model, a whole number above 0\n"
+      "The colour directory is $XDG_DATA_HOME/icc (default ~/.local/share/icc).\n"
       "\n"
       "Exit status: 0 success, 1 a failed job, 2 a usage error.\n",
       to);
@@ -112,6 +124,7 @@ int main(int argc, char** argv) {
   tool::Options options;
   std::string pluginPath = DefaultPluginPath();
   bool verbose = false;
+  bool searchGiven = false;
   std::vector<std::string> words;
   for (int i = 1; i < argc; ++i) {
     const std::string arg = argv[i];
@@ -136,6 +149,28 @@ int main(int argc, char** argv) {
       i += 2;
     } else if (arg == "--replace") {
       options.replace = true;
+    } else if (arg == "--cmm" || arg == "--class" || arg == "--space" || arg == "--pcs" || arg == "--manufacturer" ||
+               arg == "--model") {
+      if (i + 1 >= argc) return Usage(arg + " needs a value");
+      const std::string v = argv[++i];
+      if (arg == "--model") {
+        char* end = nullptr;
+        const long model = std::strtol(v.c_str(), &end, 10);
+        if (v.empty() || *end != '\0' || model < 1 || model > INT_MAX) return Usage("--model takes a whole number above 0");
+        options.search.model = static_cast<int>(model);
+        searchGiven = true;
+        continue;
+      }
+      bool printable = !v.empty() && v.size() <= 4;
+      for (unsigned char c : v) printable = printable && c >= 0x20 && c < 0x7F;
+      if (!printable) return Usage(arg + " takes a signature of 1 to 4 printable characters");
+      const std::string padded = v + std::string(4 - v.size(), ' ');
+      if (arg == "--cmm") options.search.cmm = padded;
+      if (arg == "--class") options.search.deviceClass = padded;
+      if (arg == "--space") options.search.space = padded;
+      if (arg == "--pcs") options.search.pcs = padded;
+      if (arg == "--manufacturer") options.search.manufacturer = padded;
+      searchGiven = true;
     } else if (arg == "--verbose") {
       verbose = true;
     } else if (arg == "--plugin" || arg == "--via" || arg == "--intent") {
@@ -158,8 +193,9 @@ int main(int argc, char** argv) {
   if (words.empty()) return Usage("no command given");
   const std::string command = words.front();
   const std::vector<std::string> args(words.begin() + 1, words.end());
-  if (command != "info" && command != "convert" && command != "gamut" && command != "list" && command != "tags" &&
-      command != "tag" && command != "edit" && command != "embed" && command != "extract" && command != "picture")
+  static const char* const kCommands[] = {"info", "convert", "gamut", "list",   "tags",  "tag",  "edit",
+                                          "embed", "extract", "picture", "search", "link", "blank", "copy"};
+  if (std::find(std::begin(kCommands), std::end(kCommands), command) == std::end(kCommands))
     return Usage("unknown command " + command);
   if (options.raw && command != "tag") return Usage("--raw belongs to the tag command");
   if (!options.edits.empty() && command != "edit")
@@ -167,6 +203,8 @@ int main(int argc, char** argv) {
   if (!options.output.empty() && command != "edit" && command != "embed" && command != "extract")
     return Usage("-o belongs to the edit command, and to embed and extract");
   if (options.replace && command != "embed") return Usage("--replace belongs to the embed command");
+  if (searchGiven && command != "search")
+    return Usage("--cmm, --class, --space, --pcs, --manufacturer and --model belong to the search command");
 
   std::unique_ptr<tool::Session> session;
   try {
@@ -180,6 +218,10 @@ int main(int argc, char** argv) {
     if (command == "embed") return tool::EmbedCommand(*session, args, options);
     if (command == "extract") return tool::ExtractCommand(*session, args, options);
     if (command == "picture") return tool::PictureCommand(*session, args, options);
+    if (command == "search") return tool::SearchCommand(*session, args, options);
+    if (command == "link") return tool::LinkCommand(*session, args, options);
+    if (command == "blank") return tool::BlankCommand(*session, args, options);
+    if (command == "copy") return tool::CopyCommand(*session, args, options);
     return tool::ListCommand(*session, args, options);
   } catch (const tool::UsageError& e) {
     return Usage(e.what());

@@ -28,7 +28,7 @@ TEST(CreateDeviceLinkProfile, RefusesBadArguments) {
   Profile srgb("sRGB.icc"), adobe("compatibleWithAdobeRGB1998.icc"), cmyk("ghostscript/default_cmyk.icc"),
       lab("LCMSLABI.ICM"), named("colord/x11-colors.icc");
   HPROFILE chain[2] = {srgb.get(), adobe.get()}, bad[2] = {srgb.get(), reinterpret_cast<HPROFILE>(0x4444)};
-  HPROFILE named_first[2] = {named.get(), srgb.get()}, to_lab[2] = {srgb.get(), lab.get()};
+  HPROFILE named_first[2] = {named.get(), srgb.get()};
   HPROFILE mismatch[3] = {srgb.get(), cmyk.get(), adobe.get()};
   DWORD intents[1] = {0};
   BYTE* data = reinterpret_cast<BYTE*>(0x1);
@@ -40,7 +40,7 @@ TEST(CreateDeviceLinkProfile, RefusesBadArguments) {
   } cases[] = {
       {chain, 2, nullptr, ERROR_INVALID_PARAMETER},       {nullptr, 2, &data, ERROR_INVALID_PARAMETER},
       {chain, 0, &data, ERROR_INVALID_PARAMETER},         {bad, 2, &data, ERROR_INVALID_HANDLE},
-      {named_first, 2, &data, ERROR_INVALID_PROFILE},     {to_lab, 2, &data, ERROR_INVALID_PROFILE},
+      {named_first, 2, &data, ERROR_INVALID_PROFILE},
       {mismatch, 3, &data, ERROR_COLORSPACE_MISMATCH},
   };
   for (size_t i = 0; i < std::size(cases); ++i) {
@@ -49,6 +49,34 @@ TEST(CreateDeviceLinkProfile, RefusesBadArguments) {
     if (cases[i].out) {
       EXPECT_EQ(data, nullptr);
     }
+  }
+}
+
+// A chain may begin or end in the PCS: the link then has Lab or XYZ as that end's space.
+TEST(CreateDeviceLinkProfile, LinksFromAndToTheConnectionSpaces) {
+  Profile srgb("sRGB.icc"), lab("LCMSLABI.ICM"), xyz("LCMSXYZI.ICM");
+  const struct {
+    HPROFILE first, second;
+    const char *in, *out;
+  } cases[] = {
+      {srgb.get(), lab.get(), "RGB ", "Lab "}, {lab.get(), srgb.get(), "Lab ", "RGB "},
+      {xyz.get(), srgb.get(), "XYZ ", "RGB "}, {srgb.get(), xyz.get(), "RGB ", "XYZ "},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(std::string(c.in) + "->" + c.out);
+    HPROFILE chain[2] = {c.first, c.second};
+    DWORD intents[1] = {INTENT_PERCEPTUAL};
+    BYTE* data = nullptr;
+    EXPECT_WIN32(CreateDeviceLinkProfile(chain, 2, intents, 1, BEST_MODE, &data, INDEX_DONT_CARE), TRUE,
+                 ERROR_SUCCESS);
+    ASSERT_NE(data, nullptr);
+    EXPECT_EQ(FourCC(&data[12]), "link");
+    EXPECT_EQ(FourCC(&data[16]), c.in);
+    EXPECT_EQ(FourCC(&data[20]), c.out);
+    cmsHPROFILE opened = cmsOpenProfileFromMem(data, BigEndian(data));
+    EXPECT_NE(opened, nullptr);
+    if (opened) cmsCloseProfile(opened);
+    GlobalFree(data);
   }
 }
 

@@ -78,6 +78,7 @@ class FileTest : public icctest::TempFolderTest {
 using CopyFileATest = FileTest;
 using DeleteFileATest = FileTest;
 using CreateFileATest = FileTest;
+using MoveFileExATest = FileTest;
 
 TEST_F(CopyFileATest, RefusesEachFailureWithItsCode) {
   Put("src", "source");
@@ -403,6 +404,62 @@ TEST_F(CreateFileATest, AHandleThatSharesNothingExcludesEveryOther) {
   HANDLE again = CreateFileA(f.c_str(), GENERIC_READ, 0, nullptr, OPEN_EXISTING, 0, nullptr);
   EXPECT_NE(again, INVALID_HANDLE_VALUE);
   EXPECT_TRUE(CloseHandle(again));
+}
+
+TEST_F(MoveFileExATest, RefusesEachFailureWithItsCodeAndMovesNothing) {
+  Put("src", "source");
+  Put("dst", "old");
+  ASSERT_EQ(mkfifo(Posix("fifo").c_str(), 0666), 0);
+  const struct {
+    std::string from, to;
+    DWORD flags, code;
+  } cases[] = {
+      {Win("missing"), Win("new"), 0, ERROR_FILE_NOT_FOUND},
+      {Win("nofolder/src"), Win("new"), 0, ERROR_PATH_NOT_FOUND},
+      {Win("src"), Win("nofolder/new"), 0, ERROR_PATH_NOT_FOUND},
+      {Win("src"), Win("dst"), 0, ERROR_ALREADY_EXISTS},
+      {Win("src"), Win("ro"), MOVEFILE_REPLACE_EXISTING, ERROR_ACCESS_DENIED},
+      {Win("src"), Win("dir"), MOVEFILE_REPLACE_EXISTING, ERROR_ACCESS_DENIED},
+      {Win("src"), Win("fifo"), MOVEFILE_REPLACE_EXISTING, ERROR_ACCESS_DENIED},
+      {Win("dir"), Win("dst"), MOVEFILE_REPLACE_EXISTING, ERROR_ACCESS_DENIED},
+      {Win("src"), Win("new"), MOVEFILE_DELAY_UNTIL_REBOOT, ERROR_INVALID_PARAMETER},
+      {Win("src"), Win("new"), 0x100, ERROR_INVALID_PARAMETER},
+      {"C:\\src", Win("new"), 0, ERROR_PATH_NOT_FOUND},
+      {Win("src"), "C:\\new", 0, ERROR_PATH_NOT_FOUND},
+      {Win("src"), TooLong(), 0, ERROR_FILENAME_EXCED_RANGE},
+      {"", Win("new"), 0, ERROR_PATH_NOT_FOUND},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.from + " -> " + c.to + " " + std::to_string(c.flags));
+    EXPECT_WIN32(MoveFileExA(c.from.c_str(), c.to.c_str(), c.flags), FALSE, c.code);
+  }
+  EXPECT_WIN32(MoveFileExA(Win("src").c_str(), nullptr, 0), FALSE, ERROR_PATH_NOT_FOUND);
+  EXPECT_EQ(Get("src"), "source");
+  EXPECT_EQ(Get("dst"), "old");
+  EXPECT_EQ(Get("ro"), "read-only");
+  EXPECT_EQ(Listing(), (std::set<std::string>{"src", "dst", "ro", "dir", "fifo"}));
+}
+
+TEST_F(MoveFileExATest, RenamesReplacesWhenAskedAndMovesLinksNotTheirTargets) {
+  Put("a", "first");
+  Put("b", "second");
+  EXPECT_WIN32(MoveFileExA(Win("a").c_str(), Win("c").c_str(), 0), TRUE, ERROR_SUCCESS);
+  EXPECT_WIN32(MoveFileExA(Win("c").c_str(), Win("b").c_str(), MOVEFILE_REPLACE_EXISTING | MOVEFILE_WRITE_THROUGH),
+               TRUE, ERROR_SUCCESS);
+  EXPECT_EQ(Get("b"), "first");
+  // A folder moves to a free name; a file onto itself is no change.
+  EXPECT_WIN32(MoveFileExA(Win("dir").c_str(), Win("moved").c_str(), 0), TRUE, ERROR_SUCCESS);
+  EXPECT_WIN32(MoveFileExA(Win("b").c_str(), Win("b").c_str(), 0), TRUE, ERROR_SUCCESS);
+  // A link in the way is replaced itself; its target keeps its bytes.
+  Put("target", "kept");
+  ASSERT_EQ(symlink(Posix("target").c_str(), Posix("link").c_str()), 0);
+  EXPECT_WIN32(MoveFileExA(Win("b").c_str(), Win("link").c_str(), MOVEFILE_REPLACE_EXISTING), TRUE, ERROR_SUCCESS);
+  struct stat st;
+  ASSERT_EQ(lstat(Posix("link").c_str(), &st), 0);
+  EXPECT_TRUE(S_ISREG(st.st_mode));
+  EXPECT_EQ(Get("link"), "first");
+  EXPECT_EQ(Get("target"), "kept");
+  EXPECT_EQ(Listing(), (std::set<std::string>{"ro", "moved", "target", "link"}));
 }
 
 TEST_F(FileTest, RemoveDirectoryAndSetFileAttributes) {

@@ -1,8 +1,13 @@
 // The plugin's internal senders, error routine and temporary names, driven from inside
 // while the host runs this program as the plugin: events still travel through the host.
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cstdio>
 #include <cstring>
 #include <string>
 
+#include "blank_template.h"
 #include "debugger.h"
 #include "error_state.h"
 #include "plugin_fixture.h"
@@ -101,6 +106,68 @@ TEST_F(InternalsTest, TemporaryNamesCountFromZeroAfterStartUp) {
   std::strcpy(WorkingFolderPath, folder.c_str());
   ASSERT_TRUE(MakeTempName(name, sizeof name));
   EXPECT_EQ(std::string(name), folder + "3");
+}
+
+// Without a template to copy (none in the folder, or a folder whose path leaves no room
+// for its name), BlankProfile reports it and the file it was given keeps its bytes:
+// they are not the blank profile, and their tables are not its to remove.
+TEST_F(InternalsTest, BlankProfileWithoutATemplateLeavesTheFileAlone) {
+  char saved[sizeof TempFolderPath];
+  std::memcpy(saved, TempFolderPath, sizeof saved);
+  const std::string empty = ::testing::TempDir() + "tw_empty_" + std::to_string(getpid());
+  ASSERT_EQ(mkdir(empty.c_str(), 0755), 0);
+  const std::string f = ::testing::TempDir() + "tw_blank_" + std::to_string(getpid()) + ".icc";
+  const struct {
+    std::string folder;
+    int code;
+  } cases[] = {
+      {"Z:\\" + std::string(sizeof TempFolderPath - 12, 'd') + "\\", 206},  // ERROR_FILENAME_EXCED_RANGE
+      {"Z:" + empty + "\\", 2},                                               // ERROR_FILE_NOT_FOUND
+  };
+  for (const auto& c : cases) {
+    std::memcpy(TempFolderPath, c.folder.c_str(), c.folder.size() + 1);
+    std::FILE* out = std::fopen(f.c_str(), "wb");
+    ASSERT_NE(out, nullptr);
+    std::fputs("mine", out);
+    std::fclose(out);
+    {
+      const Value blank = rt->CallGlobal("BlankProfile", {rt->MakeFolderItem(f)});
+      EXPECT_TRUE(blank.IsObject());
+      EXPECT_EQ(rt->CallGlobal("CMError").AsInteger(), c.code);
+    }
+    char text[8] = {};
+    out = std::fopen(f.c_str(), "rb");
+    ASSERT_NE(out, nullptr);
+    EXPECT_EQ(std::fread(text, 1, sizeof text, out), 4u);
+    std::fclose(out);
+    EXPECT_STREQ(text, "mine");
+  }
+  std::memcpy(TempFolderPath, saved, sizeof saved);
+  std::remove(f.c_str());
+  rmdir(empty.c_str());
+}
+
+// The template is placed only under a name that fits, and never over a file there.
+TEST(BlankTemplate, IsPlacedWholeOnlyWhereItFitsAndNoFileIsThere) {
+  const std::string dir = ::testing::TempDir() + "tw_tmpl_" + std::to_string(getpid());
+  ASSERT_EQ(mkdir(dir.c_str(), 0755), 0);
+  const std::string win = "Z:" + dir + "\\";  // TempDir is absolute; slashes pass as separators
+  const std::string deep = "Z:\\" + std::string(MAX_PATH - 10, 'd') + "\\";
+  EXPECT_FALSE(PlaceBlankTemplate(deep.c_str(), win.c_str()));
+  EXPECT_FALSE(PlaceBlankTemplate(win.c_str(), deep.c_str()));
+  EXPECT_FALSE(PlaceBlankTemplate("", win.c_str()));
+  EXPECT_TRUE(PlaceBlankTemplate(win.c_str(), win.c_str()));
+  struct stat st;
+  ASSERT_EQ(stat((dir + "/blank.icc").c_str(), &st), 0);
+  EXPECT_EQ(static_cast<std::size_t>(st.st_size), BlankTemplateBytes().size());
+  std::FILE* mine = std::fopen((dir + "/blank.icc").c_str(), "wb");
+  std::fputs("mine", mine);
+  std::fclose(mine);
+  EXPECT_TRUE(PlaceBlankTemplate(win.c_str(), win.c_str()));
+  ASSERT_EQ(stat((dir + "/blank.icc").c_str(), &st), 0);
+  EXPECT_EQ(st.st_size, 4);
+  std::remove((dir + "/blank.icc").c_str());
+  EXPECT_EQ(rmdir(dir.c_str()), 0);  // nothing staged is left behind
 }
 
 TEST(TempFolder, IsTheExecutablesFolderPlusTemp) {

@@ -19,8 +19,8 @@ TEST_F(PluginTest, RegistersItsClassesAndGlobalsWithTheStoredDeclarations) {
   const auto classes = rt->Classes();
   std::vector<std::string> names;
   for (const auto* c : classes) names.push_back(c->name);
-  EXPECT_EQ(names, (std::vector<std::string>{"halvoDebugger", "Matrix", "Vector", "VectorNC", "CMColor", "Profile",
-                                             "ColorWorld", "cLut"}));
+  EXPECT_EQ(names, (std::vector<std::string>{"halvoDebugger", "Matrix", "Vector", "VectorNC", "VectorF", "CMColor",
+                                             "Profile", "ColorWorld", "cLut"}));
   const host::ClassInfo& debugger = *classes[0];
   EXPECT_EQ(debugger.name, "halvoDebugger");
   EXPECT_EQ(debugger.dataSize, 1u);
@@ -37,18 +37,35 @@ TEST_F(PluginTest, RegistersItsClassesAndGlobalsWithTheStoredDeclarations) {
                         "DebugError(err as integer, errMessage as string)", "DebugInteger(aInteger as integer)",
                         "DebugDouble(aDouble as double)", "DebugBoolean(aBoolean as boolean)",
                         "DebugString(aString as string)"}));
-  EXPECT_EQ(globals, (std::vector<std::string>{"halvoRegisterDebugger(debugger as halvoDebugger)",
-                                               "halvoUnregisterDebugger()", "CMError() as Integer",
-                                               "CMErrorMessage() as string",
-                                               "GetImageSpace(f as Folderitem) as String",
-                                               "EmbedImage(fromf as folderitem, tof as folderitem, replace as "
-                                               "boolean, p as Profile) as Boolean",
-                                               "ImageProfileCount(f as folderitem) as Integer",
-                                               "GetImageProfile(f as folderitem, index as Integer) as Profile",
-                                               "NewConcatColorWorld(keyindex as Integer, p1 as Profile, p2 as "
-                                               "Profile, p3 as Profile, p4 as Profile) as ColorWorld"}));
+  EXPECT_EQ(globals,
+            (std::vector<std::string>{
+                "halvoRegisterDebugger(debugger as halvoDebugger)", "halvoUnregisterDebugger()",
+                "GetSystemProfile() as Profile", "CMError() as Integer", "CMErrorMessage() as string",
+                "GetImageSpace(f as Folderitem) as String", "TintwellVersion() as Integer", "GetProfileByUse(use as String) as Profile",
+                "TintwellFolder() as Folderitem", "CMMcount() as Integer",
+                "getProfileBySpace(theSpace as String) as Profile", "GetMonitorProfile() as Profile",
+                "CreateProfileIdentifier(p as profile, ident as Integer, size as Integer) as Integer",
+                "EmbedImage(fromf as folderitem, tof as folderitem, replace as boolean, p as Profile) as Boolean",
+                "ImageProfileCount(f as folderitem) as Integer",
+                "GetImageProfile(f as folderitem, index as Integer) as Profile",
+                "NewLinkProfile(f as folderitem, keyindex as Integer, p1 as Profile, p2 as Profile, p3 as Profile, "
+                "p4 as Profile) as Profile",
+                "NewConcatColorWorld(keyindex as Integer, p1 as Profile, p2 as Profile, p3 as Profile, p4 as "
+                "Profile) as ColorWorld",
+                "CopyProfile(f as folderitem, p as Profile) as Profile", "BlankProfile(f as folderitem) as Profile",
+                "ProfileSearch(cmm as String, aClass as String, dataspace as String, connectspace as String, "
+                "manufacturer as String, model as Integer, profiles as VectorF)"}));
 
-  const host::ClassInfo& color = *classes[4];
+  const host::ClassInfo& list = *classes[4];
+  EXPECT_EQ(list.properties.size(), 1u);
+  std::vector<std::string> listMethods;
+  for (const auto& m : list.methods) listMethods.push_back(m.declaration);
+  EXPECT_EQ(listMethods, (std::vector<std::string>{
+                             "Get(index as Integer) as Folderitem", "Set(index as Integer, val as Folderitem)",
+                             "Append(val as Folderitem)", "Insert(index as Integer, val as Folderitem)",
+                             "Delete(index as Integer)", "Clear()", "Count() as integer", "Ubound() as integer"}));
+
+  const host::ClassInfo& color = *classes[5];
   EXPECT_EQ(color.properties.size(), 25u);
   EXPECT_EQ(color.methods.size(), 16u);
   // Two declarations share one routine.
@@ -57,7 +74,7 @@ TEST_F(PluginTest, RegistersItsClassesAndGlobalsWithTheStoredDeclarations) {
   EXPECT_EQ(color.methods[1].function, color.methods[2].function);
 
   std::vector<std::string> profileMethods;
-  for (const auto& m : classes[5]->methods) profileMethods.push_back(m.declaration);
+  for (const auto& m : classes[6]->methods) profileMethods.push_back(m.declaration);
   EXPECT_EQ(profileMethods,
             (std::vector<std::string>{
                 "Profile(f as Folderitem)",
@@ -80,7 +97,7 @@ TEST_F(PluginTest, RegistersItsClassesAndGlobalsWithTheStoredDeclarations) {
 }
 
 TEST_F(PluginTest, ColorWorldMembersInTheirOrder) {
-  const host::ClassInfo& world = *rt->Classes()[6];
+  const host::ClassInfo& world = *rt->Classes()[7];
   ASSERT_EQ(world.name, "ColorWorld");
   std::vector<std::string> methods;
   for (const auto& m : world.methods) methods.push_back(m.declaration);

@@ -391,6 +391,58 @@ TEST(Tool, RefusesMalformedLutFiles) {
   EXPECT_EQ(Slurp(copy), original) << "a refused lut file saves nothing, not even the edits before it";
 }
 
+// search, link, blank and copy over a colour directory of the test's own.
+TEST(Tool, FindsAndMakesProfilesThroughThePlugin) {
+  const std::string dir = ::testing::TempDir() + "tw_find_" + std::to_string(getpid());
+  std::system(("rm -rf '" + dir + "' && mkdir -p '" + dir + "/icc'").c_str());
+  std::system(("cp /usr/share/color/icc/sRGB.icc /usr/share/color/icc/ghostscript/default_cmyk.icc '" + dir +
+               "/icc/'").c_str());
+  setenv("TINTWELL_COLOR_DIR", (dir + "/icc").c_str(), 1);
+
+  Result r = RunTool("search --class prtr --json");
+  ASSERT_EQ(r.status, 0) << r.err;
+  EXPECT_EQ(r.out, "[\n  {\"path\": \"" + dir + "/icc/default_cmyk.icc\", \"class\": \"prtr\", \"description\": "
+                   "\"Artifex CMYK SWOP Profile\"}\n]\n");
+  r = RunTool("search --space RGB");
+  ASSERT_EQ(r.status, 0) << r.err;
+  EXPECT_EQ(r.out, dir + "/icc/sRGB.icc  mntr  sRGB\n");
+  EXPECT_EQ(RunTool("search --model 7 --json").out, "[]\n");
+  EXPECT_EQ(RunTool("search").out.find("sRGB.icc"), RunTool("search").out.rfind("sRGB.icc"));  // listed once
+
+  const std::string link = dir + "/link.icc", blank = dir + "/blank.icc", copy = dir + "/copy.icc";
+  r = RunTool("link " + link + " srgb cmyk --intent 1");
+  ASSERT_EQ(r.status, 0) << r.err;
+  cmsHPROFILE p = cmsOpenProfileFromFile(link.c_str(), "r");
+  ASSERT_NE(p, nullptr);
+  EXPECT_EQ(cmsGetDeviceClass(p), cmsSigLinkClass);
+  cmsCloseProfile(p);
+  r = RunTool("blank " + blank);
+  ASSERT_EQ(r.status, 0) << r.err;
+  p = cmsOpenProfileFromFile(blank.c_str(), "r");
+  ASSERT_NE(p, nullptr);
+  EXPECT_TRUE(cmsIsTag(p, cmsSigRedTRCTag));
+  EXPECT_FALSE(cmsIsTag(p, cmsSigAToB0Tag));
+  cmsCloseProfile(p);
+  r = RunTool("copy " + link + " " + copy);
+  ASSERT_EQ(r.status, 0) << r.err;
+  EXPECT_EQ(Slurp(copy), Slurp(link));
+
+  // Failed jobs: exit 1, the plugin's code; usage errors: exit 2.
+  r = RunTool("link " + dir + "/missing/x.icc srgb cmyk");
+  EXPECT_EQ(r.status, 1);
+  EXPECT_NE(r.err.find("CMError -1"), std::string::npos) << r.err;
+  EXPECT_EQ(RunTool("copy " + dir + "/none.icc " + copy).status, 1);
+  EXPECT_EQ(Slurp(copy), Slurp(link));
+  for (const char* bad : {"search extra", "search --model 0", "search --model x", "search --class toolong",
+                          "info --class mntr", "link out srgb", "link a b c d e f", "blank", "copy srgb"}) {
+    r = RunTool(bad);
+    EXPECT_EQ(r.status, 2) << bad;
+    EXPECT_TRUE(r.out.empty()) << bad;
+  }
+  unsetenv("TINTWELL_COLOR_DIR");
+  std::system(("rm -rf '" + dir + "'").c_str());
+}
+
 }  // namespace
 
 #if TINTWELL_IMAGE_FILES

@@ -1,9 +1,9 @@
 // CreateDeviceLinkProfile: the chain is linked by Little CMS into a version 2 device
 // link ('link' class, lut16 AToB0, profile sequence kept) returned in a GlobalAlloc
 // block that the caller frees with GlobalFree. The chain follows the rules of
-// CreateMultiProfileTransform; its ends must be device spaces (a named-colour profile
-// first, or a chain that starts or ends in the PCS, is refused with
-// ERROR_INVALID_PROFILE).
+// CreateMultiProfileTransform. Either end may be the PCS (Lab or XYZ), as in a link
+// whose last profile is an abstract or colour-space profile; a named-colour profile
+// first is refused with ERROR_INVALID_PROFILE, since a link has no named colours.
 #include <cstring>
 #include <new>
 
@@ -37,7 +37,7 @@ extern "C" BOOL WINAPI CreateDeviceLinkProfile(PHPROFILE hProfile, DWORD nProfil
     Chain chain;
     DWORD error = chain.Build(hProfile, nProfiles, padwIntent, nIntents);
     if (error != ERROR_SUCCESS) return Fail(error);
-    if (chain.named() || IsPcsSpace(chain.input()) || IsPcsSpace(chain.output())) return Fail(ERROR_INVALID_PROFILE);
+    if (chain.named()) return Fail(ERROR_INVALID_PROFILE);
 
     LinkParts parts;
     // Formats are left open and nothing is optimised: the link is sampled afresh.

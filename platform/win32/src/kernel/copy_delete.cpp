@@ -1,4 +1,4 @@
-// CopyFileA, MoveFileExA, DeleteFileA, RemoveDirectoryA and SetFileAttributesA.
+// CopyFileA, DeleteFileA, RemoveDirectoryA and SetFileAttributesA.
 #include <fcntl.h>
 #include <stdio.h>
 #include <sys/stat.h>
@@ -89,63 +89,6 @@ DWORD CopyFileImpl(LPCSTR existing, LPCSTR target, bool failIfExists) {
   return win32::ReplaceFileWith(resolved, [&](int out) { return CopyContent(in.get(), out, source); }, options);
 }
 
-DWORD DeleteFileImpl(LPCSTR name);
-
-constexpr DWORD kMoveFlags = MOVEFILE_REPLACE_EXISTING | MOVEFILE_COPY_ALLOWED | MOVEFILE_WRITE_THROUGH;
-
-// Flushes the folder that holds path, so that a rename in it outlives a crash.
-void SyncFolderOf(const std::string& path) {
-  const std::size_t slash = path.rfind('/');
-  const std::string folder = slash == 0 ? "/" : path.substr(0, slash);
-  Fd dir(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  if (dir.get() >= 0) fsync(dir.get());
-}
-
-// A rename inside one file system is atomic: the target is either the old file or the
-// new one. Across file systems the file is copied and the source deleted, when allowed.
-DWORD MoveFileImpl(LPCSTR existing, LPCSTR target, DWORD flags) {
-  if ((flags & ~kMoveFlags) != 0) return ERROR_INVALID_PARAMETER;  // delayed moves are not offered
-  std::string from, to;
-  if (const DWORD err = win32::PosixFileFromWindows(existing, &from)) return err;
-  if (const DWORD err = win32::PosixFileFromWindows(target, &to)) return err;
-  const bool replace = (flags & MOVEFILE_REPLACE_EXISTING) != 0;
-  struct stat source, dest;
-  if (lstat(from.c_str(), &source) != 0) return win32::FileErrorFromErrno(errno, from);
-  if (lstat(to.c_str(), &dest) == 0) {
-    if (!replace) return ERROR_ALREADY_EXISTS;
-    // Windows replaces no folder and no read-only file.
-    if (S_ISDIR(dest.st_mode) || (!S_ISLNK(dest.st_mode) && win32::IsReadOnlyMode(dest.st_mode)))
-      return ERROR_ACCESS_DENIED;
-  } else if (errno != ENOENT) {
-    return win32::FileErrorFromErrno(errno, to);
-  } else if (win32::MissingFileError(to) == ERROR_PATH_NOT_FOUND) {
-    return ERROR_PATH_NOT_FOUND;
-  }
-  int rc = replace ? rename(from.c_str(), to.c_str())
-                   : renameat2(AT_FDCWD, from.c_str(), AT_FDCWD, to.c_str(), RENAME_NOREPLACE);
-  if (rc != 0 && !replace && errno == EINVAL) {
-    // A file system without no-replace renames: a hard link refuses an existing target.
-    rc = link(from.c_str(), to.c_str());
-    if (rc == 0 && unlink(from.c_str()) != 0) {
-      const int err = errno;
-      unlink(to.c_str());
-      errno = err;
-      rc = -1;
-    }
-  }
-  if (rc == 0) {
-    if (flags & MOVEFILE_WRITE_THROUGH) SyncFolderOf(to);
-    return ERROR_SUCCESS;
-  }
-  if (errno == EEXIST) return ERROR_ALREADY_EXISTS;
-  if (errno == EXDEV) {
-    if (!(flags & MOVEFILE_COPY_ALLOWED) || S_ISDIR(source.st_mode)) return ERROR_NOT_SAME_DEVICE;
-    if (const DWORD err = CopyFileImpl(existing, target, !replace)) return err;
-    return DeleteFileImpl(existing);
-  }
-  return win32::FileErrorFromErrno(errno, to);
-}
-
 DWORD DeleteFileImpl(LPCSTR name) {
   std::string path;
   if (const DWORD err = win32::PosixFileFromWindows(name, &path)) return err;
@@ -192,14 +135,6 @@ extern "C" BOOL WINAPI CopyFileA(LPCSTR lpExistingFileName, LPCSTR lpNewFileName
                                  BOOL bFailIfExists) {
   try {
     return Finish(CopyFileImpl(lpExistingFileName, lpNewFileName, bFailIfExists != FALSE));
-  } catch (const std::bad_alloc&) {
-    return Finish(ERROR_NOT_ENOUGH_MEMORY);
-  }
-}
-
-extern "C" BOOL WINAPI MoveFileExA(LPCSTR lpExistingFileName, LPCSTR lpNewFileName, DWORD dwFlags) {
-  try {
-    return Finish(MoveFileImpl(lpExistingFileName, lpNewFileName, dwFlags));
   } catch (const std::bad_alloc&) {
     return Finish(ERROR_NOT_ENOUGH_MEMORY);
   }
