@@ -3,7 +3,13 @@
 #include "registration.h"
 #include "temp_folder.h"
 
-extern "C" __attribute__((visibility("default"))) void REALPluginMain(REALresolver resolver) {
+#ifdef _WIN32
+#define TINTWELL_EXPORT __declspec(dllexport)
+#else
+#define TINTWELL_EXPORT __attribute__((visibility("default")))
+#endif
+
+extern "C" TINTWELL_EXPORT void REALPluginMain(REALresolver resolver) {
   bridge::SetResolver(resolver);
   bridge::RegisterPluginVersion(REAL_PLUGIN_VERSION);
   RegisterClasses();

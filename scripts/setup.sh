@@ -1,5 +1,7 @@
 #!/usr/bin/env bash
 # Installs every Debian package the project needs. Idempotent and quiet when all is present.
+#   scripts/setup.sh            the Linux build, tests, benchmarks and fuzzing
+#   scripts/setup.sh --windows  also the MinGW-w64 cross compilers, 32-bit g++ and Wine
 set -euo pipefail
 
 packages=(
@@ -9,6 +11,12 @@ packages=(
   libgtest-dev libgmock-dev googletest libbenchmark-dev
   icc-profiles-free colord-data libgs-common argyll
 )
+case "${1:-}" in
+  --windows)
+    packages+=(g++-mingw-w64-i686 g++-mingw-w64-x86-64 g++-multilib wine64 binutils-mingw-w64-x86-64) ;;
+  "") ;;
+  *) echo "usage: $0 [--windows]" >&2; exit 2 ;;
+esac
 
 missing=()
 for p in "${packages[@]}"; do

@@ -363,7 +363,7 @@ TEST_F(CreateFileATest, WriteFileWritesFromTheStartAndRefusesBadHandles) {
   HANDLE readOnly = CreateFileA(Win("f").c_str(), GENERIC_READ, share, nullptr, OPEN_EXISTING, 0, nullptr);
   ASSERT_NE(readOnly, INVALID_HANDLE_VALUE);
   DWORD n = kSentinel;
-  char overlapped[32] = {};
+  OVERLAPPED overlapped = {};
   EXPECT_WIN32(WriteFile(h, "J", 1, &n, nullptr), TRUE, ERROR_SUCCESS);
   EXPECT_EQ(n, 1u);
   const std::string big(3 << 20, 'b');
@@ -371,7 +371,7 @@ TEST_F(CreateFileATest, WriteFileWritesFromTheStartAndRefusesBadHandles) {
   EXPECT_WIN32(WriteFile(h, big.data(), size, &n, nullptr), TRUE, ERROR_SUCCESS);
   EXPECT_EQ(n, big.size());
   EXPECT_WIN32(WriteFile(h, "abc", 3, nullptr, nullptr), FALSE, ERROR_INVALID_PARAMETER);
-  EXPECT_WIN32(WriteFile(h, "abc", 3, &n, overlapped), FALSE, ERROR_INVALID_PARAMETER);
+  EXPECT_WIN32(WriteFile(h, "abc", 3, &n, &overlapped), FALSE, ERROR_INVALID_PARAMETER);
   EXPECT_WIN32(WriteFile(readOnly, "abc", 3, &n, nullptr), FALSE, ERROR_ACCESS_DENIED);
   EXPECT_WIN32(CloseHandle(readOnly), TRUE, ERROR_SUCCESS);
   EXPECT_WIN32(CloseHandle(h), TRUE, ERROR_SUCCESS);

@@ -1,9 +1,9 @@
 /* The Image Color Management (mscms) declarations the plugin uses, for Linux builds.
  *
- * Layouts and values follow the Windows SDK. One deliberate difference: COLOR has no
- * pointer member, so it is 8 bytes on every platform, as on 32-bit Windows; the plugin
- * keeps one COLOR per colour value and TranslateColors must never write past it.
- * Four-character codes are written as hex values ('mntr' is 0x6D6E7472). */
+ * Layouts and values follow the Windows SDK. COLOR holds a pointer among its members, as
+ * the SDK's does: 8 bytes on 32-bit platforms, 16 on 64-bit ones. A colour's data take
+ * the first 8 bytes; TranslateColors never writes past them. Four-character codes are
+ * written as hex values ('mntr' is 0x6D6E7472). */
 #ifndef TINTWELL_WIN32_ICM_H
 #define TINTWELL_WIN32_ICM_H
 
@@ -35,6 +35,10 @@ typedef union tagCOLOR {
   struct GENERIC3CHANNEL gen3ch;
   struct NAMEDCOLOR named;
   struct HiFiCOLOR hifi;
+  struct {
+    DWORD reserved1;
+    VOID* reserved2;
+  };
 } COLOR;
 typedef COLOR *PCOLOR, *LPCOLOR;
 

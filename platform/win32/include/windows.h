@@ -3,7 +3,12 @@
  * Names, types, struct layouts and constants follow the Windows SDK (as published in
  * the MinGW-w64 headers). DWORD, LONG and BOOL are 32-bit types here, as on Windows,
  * so records such as PROFILEHEADER and BITMAPINFOHEADER keep their Windows sizes on
- * 64-bit Linux. On Windows the SDK's own <windows.h> is used instead of this file. */
+ * 64-bit Linux. On Windows the SDK's own <windows.h> is used instead of this file.
+ *
+ * Where the SDK writes a constant with an L suffix (a 32-bit long on Windows), this file
+ * writes the same value as a 32-bit int or unsigned int: on 64-bit Linux a long is 8
+ * bytes, and `r == GDI_ERROR` for an int r would no longer mean what it means on
+ * Windows. tests/windows/header_check.py holds this file against the SDK's. */
 #ifndef TINTWELL_WIN32_WINDOWS_H
 #define TINTWELL_WIN32_WINDOWS_H
 
@@ -18,8 +23,14 @@
 extern "C" {
 #endif
 
+/* The system's calls are stdcall on 32-bit x86, as on Windows; elsewhere there is one
+ * calling convention. */
+#if defined(__i386__)
+#define WINAPI __attribute__((stdcall))
+#else
 #define WINAPI
-#define CALLBACK
+#endif
+#define CALLBACK WINAPI
 
 typedef uint8_t BYTE;
 typedef uint16_t WORD;
@@ -53,11 +64,18 @@ typedef char* PSTR;
 typedef const char* LPCSTR;
 typedef const char* PCSTR;
 
+/* Handles to distinct kinds of object are distinct types, as with the SDK's STRICT. */
+#define DECLARE_HANDLE(name) \
+  struct name##__ {          \
+    int unused;              \
+  };                         \
+  typedef struct name##__* name
+
 typedef void* HANDLE;
-typedef HANDLE HMODULE;
-typedef HANDLE HINSTANCE;
+DECLARE_HANDLE(HINSTANCE);
+typedef HINSTANCE HMODULE;
 typedef HANDLE HGLOBAL;
-typedef HANDLE HDC;
+DECLARE_HANDLE(HDC);
 typedef DWORD COLORREF;
 typedef LONG FXPT2DOT30;
 
@@ -126,7 +144,7 @@ typedef LONG FXPT2DOT30;
 #define FILE_SHARE_DELETE 0x00000004
 
 #define GENERIC_READ 0x80000000u
-#define GENERIC_WRITE 0x40000000u
+#define GENERIC_WRITE 0x40000000
 
 #define FILE_ATTRIBUTE_READONLY 0x00000001
 #define FILE_ATTRIBUTE_HIDDEN 0x00000002
@@ -175,6 +193,19 @@ typedef struct _WIN32_FIND_DATAA {
   CHAR cAlternateFileName[14];
 } WIN32_FIND_DATAA, *PWIN32_FIND_DATAA, *LPWIN32_FIND_DATAA;
 
+typedef struct _OVERLAPPED {
+  ULONG_PTR Internal;
+  ULONG_PTR InternalHigh;
+  union {
+    struct {
+      DWORD Offset;
+      DWORD OffsetHigh;
+    };
+    PVOID Pointer;
+  };
+  HANDLE hEvent;
+} OVERLAPPED, *LPOVERLAPPED;
+
 /* Global memory (winbase.h). */
 #define GMEM_FIXED 0x0
 #define GMEM_MOVEABLE 0x2
@@ -196,11 +227,11 @@ typedef struct _WIN32_FIND_DATAA {
 #define GetGValue(rgb) ((BYTE)(((WORD)(rgb)) >> 8))
 #define GetBValue(rgb) ((BYTE)((rgb) >> 16))
 #define CLR_INVALID 0xFFFFFFFF
-#define GDI_ERROR 0xFFFFFFFFL
-#define BI_RGB 0L
+#define GDI_ERROR 0xFFFFFFFFu /* 0xFFFFFFFFL: a 32-bit unsigned long */
+#define BI_RGB 0               /* 0L */
 #define DIB_RGB_COLORS 0
 #define DIB_PAL_COLORS 1
-#define SRCCOPY 0x00CC0020
+#define SRCCOPY (DWORD)0x00CC0020
 
 typedef struct tagRGBTRIPLE {
   BYTE rgbtBlue;
@@ -259,7 +290,7 @@ HANDLE WINAPI CreateFileA(LPCSTR lpFileName, DWORD dwDesiredAccess, DWORD dwShar
                           LPSECURITY_ATTRIBUTES lpSecurityAttributes, DWORD dwCreationDisposition,
                           DWORD dwFlagsAndAttributes, HANDLE hTemplateFile);
 BOOL WINAPI WriteFile(HANDLE hFile, LPCVOID lpBuffer, DWORD nNumberOfBytesToWrite,
-                      LPDWORD lpNumberOfBytesWritten, void* lpOverlapped);
+                      LPDWORD lpNumberOfBytesWritten, LPOVERLAPPED lpOverlapped);
 BOOL WINAPI CloseHandle(HANDLE hObject);
 BOOL WINAPI ReadFile(HANDLE hFile, LPVOID lpBuffer, DWORD nNumberOfBytesToRead, LPDWORD lpNumberOfBytesRead,
                      void* lpOverlapped);

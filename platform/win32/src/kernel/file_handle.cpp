@@ -137,7 +137,7 @@ extern "C" HANDLE WINAPI CreateFileA(LPCSTR lpFileName, DWORD dwDesiredAccess,
 }
 
 extern "C" BOOL WINAPI WriteFile(HANDLE hFile, LPCVOID lpBuffer, DWORD nNumberOfBytesToWrite,
-                                 LPDWORD lpNumberOfBytesWritten, void* lpOverlapped) {
+                                 LPDWORD lpNumberOfBytesWritten, LPOVERLAPPED lpOverlapped) {
   const auto file = win32::Handles().Lookup<OpenFile>(hFile, win32::HandleKind::File);
   if (!file) {
     SetLastError(ERROR_INVALID_HANDLE);
