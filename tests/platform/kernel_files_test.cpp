@@ -520,9 +520,9 @@ TEST_F(ReadFileTest, ReadsOnFromThePositionAndSizesTheFile) {
   EXPECT_WIN32(ReadFile(h, &got[0], 4, &n, nullptr), TRUE, ERROR_SUCCESS);
   EXPECT_EQ(n, 0u) << "at the end";
 
-  char overlapped[32] = {};
+  OVERLAPPED overlapped = {};
   EXPECT_WIN32(ReadFile(h, &got[0], 3, nullptr, nullptr), FALSE, ERROR_INVALID_PARAMETER);
-  EXPECT_WIN32(ReadFile(h, &got[0], 3, &n, overlapped), FALSE, ERROR_INVALID_PARAMETER);
+  EXPECT_WIN32(ReadFile(h, &got[0], 3, &n, &overlapped), FALSE, ERROR_INVALID_PARAMETER);
   EXPECT_WIN32(ReadFile(h, nullptr, 3, &n, nullptr), FALSE, ERROR_INVALID_PARAMETER);
   n = kSentinel;
   EXPECT_WIN32(ReadFile(writeOnly, &got[0], 3, &n, nullptr), FALSE, ERROR_ACCESS_DENIED);

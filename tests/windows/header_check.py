@@ -129,6 +129,8 @@ def parse_header(path, names):
         code.append(line)
     code = re.sub(r'extern\s+"C"\s*\{', " ", "\n".join(code))
     for st in split_top(code):
+        # Attributes (an alignment that matches the SDK's on 32-bit) are not names.
+        st = re.sub(r"__attribute__\s*\(\((?:[^()]|\([^()]*\))*\)\)", " ", st)
         st = " ".join(st.split())
         if not st:
             continue

@@ -47,7 +47,8 @@ typedef intptr_t LONG_PTR;
 typedef uintptr_t ULONG_PTR;
 typedef intptr_t LPARAM;
 typedef size_t SIZE_T;
-typedef int64_t LONGLONG;
+/* 8-byte aligned in records on 32-bit targets too, as on Windows. */
+typedef int64_t LONGLONG __attribute__((aligned(8)));
 
 typedef BYTE* PBYTE;
 typedef BYTE* LPBYTE;
@@ -293,7 +294,7 @@ BOOL WINAPI WriteFile(HANDLE hFile, LPCVOID lpBuffer, DWORD nNumberOfBytesToWrit
                       LPDWORD lpNumberOfBytesWritten, LPOVERLAPPED lpOverlapped);
 BOOL WINAPI CloseHandle(HANDLE hObject);
 BOOL WINAPI ReadFile(HANDLE hFile, LPVOID lpBuffer, DWORD nNumberOfBytesToRead, LPDWORD lpNumberOfBytesRead,
-                     void* lpOverlapped);
+                     LPOVERLAPPED lpOverlapped);
 BOOL WINAPI GetFileSizeEx(HANDLE hFile, PLARGE_INTEGER lpFileSize);
 
 /* gdi32 */

@@ -174,7 +174,7 @@ extern "C" BOOL WINAPI WriteFile(HANDLE hFile, LPCVOID lpBuffer, DWORD nNumberOf
 // Reads up to the count from the file position; at the end of the file it succeeds with
 // fewer bytes, or none.
 extern "C" BOOL WINAPI ReadFile(HANDLE hFile, LPVOID lpBuffer, DWORD nNumberOfBytesToRead,
-                                LPDWORD lpNumberOfBytesRead, void* lpOverlapped) {
+                                LPDWORD lpNumberOfBytesRead, LPOVERLAPPED lpOverlapped) {
   const auto file = win32::Handles().Lookup<OpenFile>(hFile, win32::HandleKind::File);
   if (!file) {
     SetLastError(ERROR_INVALID_HANDLE);
