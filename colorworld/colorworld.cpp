@@ -58,6 +58,7 @@ void Concatenate(ColorWorldData* d, int32_t keyindex, REALobject const profiles[
     d->outType = static_cast<uint8_t>(ColorTypeForSpace(header.phDataColorSpace));
     ++count;
   }
+  ClearLastError();
   d->transform = CreateMultiProfileTransform(handles, count, intents, count, BEST_MODE, static_cast<DWORD>(keyindex));
   LastCMError = static_cast<int32_t>(GetLastError());
   SetCMError(LastCMError);
@@ -92,6 +93,7 @@ void ConstructFromPair(REALobject self, REALobject src, REALobject dest) {
   d->outType = static_cast<uint8_t>(ColorTypeForSpace(destination.phDataColorSpace));
   HPROFILE handles[2] = {ProfileHandle(src), ProfileHandle(dest)};
   DWORD intents[2] = {source.phRenderingIntent, destination.phRenderingIntent};
+  ClearLastError();
   d->transform = CreateMultiProfileTransform(handles, 2, intents, 2, BEST_MODE, INDEX_DONT_CARE);
   const DWORD code = GetLastError();
   if (!d->transform) SendDebugString("Colorworld is BAD");
@@ -125,6 +127,7 @@ void LinkColorWorld(REALobject self, REALobject link) {
   d->inType = static_cast<uint8_t>(ColorTypeForSpace(header.phDataColorSpace));
   d->outType = static_cast<uint8_t>(ColorTypeForSpace(header.phConnectionSpace));
   DWORD intent = header.phRenderingIntent;
+  ClearLastError();
   d->transform = CreateMultiProfileTransform(&handle, 1, &intent, 1, BEST_MODE, INDEX_DONT_CARE);
   const DWORD code = GetLastError();
   if (!d->transform) SendDebugString("Colorworld is BAD");

@@ -5,4 +5,9 @@
 #include <windows.h>
 #include <icm.h>
 
+// Windows leaves a failure's code in place across later successful calls. Where the
+// plugin reports the last error after a call that may succeed, it clears it first, so
+// that a success reports 0 rather than an older failure.
+inline void ClearLastError() { SetLastError(ERROR_SUCCESS); }
+
 #endif

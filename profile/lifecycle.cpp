@@ -64,6 +64,7 @@ void ReleasePrevious(ProfileData* d) {
 }
 
 HPROFILE OpenByFullPath(const char* path) {
+  ClearLastError();
   PROFILE spec = {PROFILE_FILENAME, const_cast<char*>(path), static_cast<DWORD>(std::strlen(path) + 1)};
   return OpenColorProfileA(&spec, PROFILE_READWRITE, FILE_SHARE_READ | FILE_SHARE_WRITE, OPEN_EXISTING);
 }
@@ -90,6 +91,7 @@ bool PreparePaths(ProfileData* d, REALfolderItem f) {
 // Copies the own file to the working copy; reports a failure. The copy is always the
 // plugin's own writable file, whatever the attributes of the file it copies.
 bool CopyToWorkingCopy(ProfileData* d) {
+  ClearLastError();
   if (CopyFileA(d->path, d->tempPath, FALSE) && SetFileAttributesA(d->tempPath, FILE_ATTRIBUTE_NORMAL)) return true;
   ReportSystemError();
   CopyFailed();
@@ -117,6 +119,7 @@ void SaveTo(ProfileData* d, const char* destination, const char* trace, bool tra
   SendDebugString(trace);
   SendDebugString(d->tempPath);
   SendDebugString(destination);
+  ClearLastError();
   if (!CopyFileA(d->tempPath, destination, FALSE)) {
     ReportSystemError();
     CopyFailed();
@@ -239,6 +242,7 @@ bool ValidProfile(REALobject self) {
 void Destruct(REALobject self) {
   ProfileData* d = Data(self);
   if (d->profile) {
+    ClearLastError();
     CloseColorProfile(d->profile);
     d->profile = 0;
     ReportSystemError();

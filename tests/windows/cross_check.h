@@ -53,6 +53,10 @@ int Run(Host& host, const std::string& srgbPath, const std::string& labPath, std
       std::fprintf(out, "%s %s %.4f\n", p.name, field, host.GetDouble(*p.object, field));
   }
 
+  // A profile that is not there, just before the colour world: Windows (and Wine) keep a
+  // failure's code across later successful calls, so the world must still report 0.
+  auto missing = host.OpenProfile(srgbPath + ".missing");
+  std::fprintf(out, "open missing error %d\n", host.Error());
   auto world = host.NewColorWorld(srgb, lab);
   std::fprintf(out, "colorworld error %d\n", host.Error());
   const double inputs[][3] = {{255, 255, 255}, {255, 0, 0},   {0, 255, 0},   {0, 0, 255},
@@ -72,11 +76,6 @@ int Run(Host& host, const std::string& srgbPath, const std::string& labPath, std
   host.Release(lab);
   host.Release(srgb);
 
-  // A profile that is not there: the error event and the code each layer reports. Last of
-  // all: the plugin reads the last error after some successful calls too, and Wine,
-  // unlike the stand-in, leaves a failure's code in place across later successes.
-  auto missing = host.OpenProfile(srgbPath + ".missing");
-  std::fprintf(out, "open missing error %d\n", host.Error());
   host.Release(missing);
   host.Unregister();
   host.Release(debugger);
