@@ -23,12 +23,21 @@ void CheckLink(BYTE* block, std::vector<HPROFILE>& chain) {
   PROFILE p{PROFILE_MEMBUFFER, block, size};
   HPROFILE link = OpenColorProfileA(&p, PROFILE_READ, 0, OPEN_EXISTING);
   fuzz::Check(link != nullptr);
-  PROFILEHEADER header, first, last;
-  fuzz::Check(GetColorProfileHeader(link, &header) && GetColorProfileHeader(chain.front(), &first) &&
-              GetColorProfileHeader(chain.back(), &last));
+  PROFILEHEADER header, first;
+  fuzz::Check(GetColorProfileHeader(link, &header) && GetColorProfileHeader(chain.front(), &first));
   fuzz::Check(header.phClass == CLASS_LINK && header.phDataColorSpace == first.phDataColorSpace);
-  fuzz::Check(header.phConnectionSpace ==
-              (last.phClass == CLASS_LINK ? last.phConnectionSpace : last.phDataColorSpace));
+  // The link ends where its chain does: after the first profile, a device profile that
+  // receives the PCS gives its device space, and one that receives a device space gives
+  // the PCS; links and abstract profiles always run forwards.
+  DWORD space = first.phDataColorSpace;
+  for (std::size_t i = 0; i < chain.size(); ++i) {
+    PROFILEHEADER h;
+    fuzz::Check(GetColorProfileHeader(chain[i], &h));
+    const bool forwards = h.phClass == CLASS_LINK || h.phClass == CLASS_ABSTRACT;
+    const bool pcs = space == SPACE_Lab || space == SPACE_XYZ;
+    space = !forwards && i > 0 && pcs ? h.phDataColorSpace : h.phConnectionSpace;
+  }
+  fuzz::Check(header.phConnectionSpace == space);
 
   DWORD intent = INTENT_PERCEPTUAL;
   SetLastError(fuzz::kSentinel);
