@@ -4,6 +4,7 @@
 #include <cstring>
 
 #include "class_tables.h"
+#include "growable.h"
 #include "cmcolor.h"
 #include "error_state.h"
 #include "host_bridge.h"
@@ -18,21 +19,8 @@ constexpr uint32_t kMaxEntries = (0xFFFFFFFFu - 84u) / (38u + 2u * kMaxDeviceCoo
 
 VectorNCData* Data(REALobject self) { return GetVectorNCData(self); }
 
-// Makes room for at least needed entries, keeping those held. False, and the list
-// unchanged, when the storage cannot grow to it.
 bool Reserve(VectorNCData* list, uint64_t needed) {
-  if (needed <= list->capacity) return true;
-  if (needed > kMaxEntries) return false;
-  uint64_t capacity = list->capacity < 4 ? 8 : uint64_t{list->capacity} * 2;
-  if (capacity < needed) capacity = needed;
-  if (capacity > kMaxEntries) capacity = kMaxEntries;
-  const uint64_t bytes = capacity * sizeof(NamedColorEntry);
-  if (bytes != static_cast<std::size_t>(bytes)) return false;  // beyond a 32-bit address space
-  void* grown = std::realloc(list->entries, static_cast<std::size_t>(bytes));
-  if (!grown) return false;
-  list->entries = static_cast<NamedColorEntry*>(grown);
-  list->capacity = static_cast<uint32_t>(capacity);
-  return true;
+  return GrowStorage(list->entries, list->capacity, needed, kMaxEntries);
 }
 
 bool InRange(const VectorNCData* list, int32_t index) {

@@ -4,6 +4,7 @@
 #include <cstring>
 
 #include "class_tables.h"
+#include "growable.h"
 #include "debugger.h"
 
 namespace {
@@ -16,25 +17,7 @@ constexpr uint32_t kMaxCount = 0x08000000u;
 
 VectorData* Data(REALobject self) { return GetVectorData(self); }
 
-// Makes room for needed elements. False, and nothing changed, when needed is beyond the
-// limit or the storage cannot grow. Growth is geometric so that appends stay cheap.
-bool Reserve(VectorData* v, uint64_t needed) {
-  if (needed <= v->capacity) return true;
-  if (needed > kMaxCount) return false;
-  uint64_t target = static_cast<uint64_t>(v->capacity) * 2;
-  if (target < 8) target = 8;
-  if (target > kMaxCount) target = kMaxCount;
-  if (target < needed) target = needed;
-  void* grown = std::realloc(v->elements, static_cast<std::size_t>(target * sizeof(double)));
-  if (!grown && target > needed) {  // a doubling too many: try for exactly what is needed
-    target = needed;
-    grown = std::realloc(v->elements, static_cast<std::size_t>(target * sizeof(double)));
-  }
-  if (!grown) return false;  // realloc left the old storage in place
-  v->elements = static_cast<double*>(grown);
-  v->capacity = static_cast<uint32_t>(target);
-  return true;
-}
+bool Reserve(VectorData* v, uint64_t needed) { return GrowStorage(v->elements, v->capacity, needed, kMaxCount); }
 
 bool InRange(const VectorData* v, int32_t index) { return index >= 0 && static_cast<uint32_t>(index) < v->count; }
 

@@ -4,6 +4,7 @@
 #include <cstdlib>
 #include <tuple>
 
+#include "growable.h"
 #include "matrix.h"
 #include "plugin_fixture.h"
 #include "vector.h"
@@ -14,6 +15,23 @@ class VectorMatrixRecordsTest : public PluginTest {
  protected:
   VectorMatrixRecordsTest() : PluginTest("") {}
 };
+
+// The lists' storage doubles from 8, is capped at the limit, reaches the limit exactly,
+// and refuses anything beyond it without touching what it holds.
+TEST(GrowStorage, DoublesFromEightUpToTheLimitAndNoFurther) {
+  int* elements = nullptr;
+  uint32_t capacity = 0;
+  const struct {
+    uint64_t needed;
+    bool grows;
+    uint32_t capacity;
+  } steps[] = {{0, true, 0}, {1, true, 8}, {8, true, 8}, {9, true, 16}, {20, true, 20}, {21, false, 20}};
+  for (const auto& step : steps) {
+    EXPECT_EQ(GrowStorage(elements, capacity, step.needed, 20), step.grows) << step.needed;
+    EXPECT_EQ(capacity, step.capacity) << step.needed;
+  }
+  std::free(elements);
+}
 
 TEST_F(VectorMatrixRecordsTest, AppendGrowsAZeroedRecordAndRefusesToWrapAFullCount) {
   VectorData zeroed{};  // as the host hands it out
