@@ -19,3 +19,13 @@ run gamut cmyk 50 80 -80
 run tags srgb
 run tag srgb wtpt
 run tag srgb desc
+
+# Profiles made through the plugin, then found again by the search in a colour
+# directory of their own.
+made=$(mktemp -d)
+trap 'rm -rf "$made"' EXIT
+run link "$made/srgb-to-cmyk.icc" srgb cmyk --intent 1
+run blank "$made/blank.icc"
+mkdir -p "$made/icc"
+cp "$made/srgb-to-cmyk.icc" "$made/blank.icc" "$made/icc/"
+XDG_DATA_HOME=$made run search --class link
