@@ -141,15 +141,7 @@ int ConvertCommand(Session& session, const std::vector<std::string>& args, const
   const ColorAccess in = named ? NamedColorAccess() : AccessForSpace(SpaceOf(session, src));
   const ColorAccess out = AccessForSpace(SpaceOf(session, dst));
 
-  host::Object world;
-  if (via.empty()) {
-    world = rt.New("ColorWorld", {src, dst});
-  } else {
-    world = rt.New("ColorWorld");
-    host::Value second = via.size() > 1 ? host::Value(via[1]) : host::Value();
-    rt.Call(world, "ConcatColorWorld", {0, src, via[0], second, dst});
-  }
-  session.Check("cannot build a colour world from these profiles");
+  host::Object world = session.NewColorWorld(src, dst, via);
 
   // Colours come from the arguments, or one a line from the input. All of them are
   // read and checked before the first is converted, so a bad value or line prints

@@ -92,15 +92,7 @@ int PictureCommand(Session& session, const std::vector<std::string>& args, const
     rt.Set(src, "RenderIntent", options.intent);
     rt.Set(dst, "RenderIntent", options.intent);
   }
-  host::Object world;
-  if (via.empty()) {
-    world = rt.New("ColorWorld", {src, dst});
-  } else {
-    world = rt.New("ColorWorld");
-    host::Value second = via.size() > 1 ? host::Value(via[1]) : host::Value();
-    rt.Call(world, "ConcatColorWorld", {0, src, via[0], second, dst});
-  }
-  session.Check("cannot build a colour world from these profiles");
+  host::Object world = session.NewColorWorld(src, dst, via);
 
   if (big) std::fprintf(stderr, "tintwell: converting\n");
   const host::Value result = rt.Call(world, "MatchPicture", {picture, extras.width, extras.height, 32, false});

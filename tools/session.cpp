@@ -92,4 +92,18 @@ std::vector<std::string> Session::TakeTraces() {
   return taken;
 }
 
+host::Object Session::NewColorWorld(const host::Object& src, const host::Object& dst,
+                                   const std::vector<host::Object>& via) {
+  host::Object world;
+  if (via.empty()) {
+    world = runtime_->New("ColorWorld", {src, dst});
+  } else {
+    world = runtime_->New("ColorWorld");
+    const host::Value second = via.size() > 1 ? host::Value(via[1]) : host::Value();
+    runtime_->Call(world, "ConcatColorWorld", {0, src, via[0], second, dst});
+  }
+  Check("cannot build a colour world from these profiles");
+  return world;
+}
+
 }  // namespace tool

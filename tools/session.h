@@ -37,6 +37,9 @@ class Session {
   // The file a profile argument names: the path itself when it exists, else the file of
   // the built-in profile of that name, else the argument unchanged.
   static std::string ProfilePath(const std::string& nameOrPath);
+  // The colour world src -> dst, through up to two profiles between them; throws
+  // JobError when the plugin cannot build it.
+  host::Object NewColorWorld(const host::Object& src, const host::Object& dst, const std::vector<host::Object>& via);
   // The traces the plugin sent since the last call (texts and values, one a line).
   std::vector<std::string> TakeTraces();
 

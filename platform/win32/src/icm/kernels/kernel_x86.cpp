@@ -47,15 +47,9 @@ inline void MatrixPixelSse2(const FastPath& p, const std::uint8_t* s, const Pixe
 template <unsigned N>
 inline void ClutPixelSse2(const FastPath& p, const std::uint8_t* s, const PixelLayout& in, std::uint8_t* d,
                           const PixelLayout& out) {
-  std::int32_t w[N], st[N], base = 0;
-  for (unsigned a = 0; a < N; ++a) {
-    const std::uint8_t v = s[in.at[a]];
-    base += p.offset[a * 256 + v];
-    w[a] = p.weight[a * 256 + v];
-    st[a] = p.stride[a];
-  }
+  std::int32_t base;
+  const ops::Simplex<N> sx = ops::Locate<N>(p, s, in, base);
   const std::uint8_t x = ops::FillerOf(s, in);
-  const ops::Simplex<N> sx = ops::Sort<N>(w, st);
   const std::int16_t* c = &p.nodes[base];
   __m128i n[N + 1];
   n[0] = _mm_loadl_epi64(reinterpret_cast<const __m128i*>(c));

@@ -57,18 +57,27 @@ inline Simplex<N> Sort(const std::int32_t* w, const std::int32_t* s) {
   return r;
 }
 
+// The grid cell that holds a pixel: the offset of its lower corner into the nodes, and
+// the simplex (weights in falling order, with the steps between its corners).
 template <unsigned N>
-inline void ClutPixel(const FastPath& p, const std::uint8_t* s, const PixelLayout& in, std::uint8_t* d,
-                      const PixelLayout& out) {
-  std::int32_t w[N], st[N], base = 0;
+inline Simplex<N> Locate(const FastPath& p, const std::uint8_t* s, const PixelLayout& in, std::int32_t& base) {
+  std::int32_t w[N], st[N];
+  base = 0;
   for (unsigned a = 0; a < N; ++a) {
     const std::uint8_t v = s[in.at[a]];
     base += p.offset[a * 256 + v];
     w[a] = p.weight[a * 256 + v];
     st[a] = p.stride[a];
   }
+  return Sort<N>(w, st);
+}
+
+template <unsigned N>
+inline void ClutPixel(const FastPath& p, const std::uint8_t* s, const PixelLayout& in, std::uint8_t* d,
+                      const PixelLayout& out) {
+  std::int32_t base;
+  const Simplex<N> sx = Locate<N>(p, s, in, base);
   const std::uint8_t x = FillerOf(s, in);
-  const Simplex<N> sx = Sort<N>(w, st);
   const std::int16_t* c[N + 1];
   c[0] = &p.nodes[base];
   for (unsigned i = 0; i < N; ++i) c[i + 1] = c[i] + sx.step[i];
