@@ -61,16 +61,39 @@ void BuildTable1(cmsHTRANSFORM exact, FastPath& fp) {
   }
 }
 
-// The input curves that begin the first profile's device-to-PCS table, sampled at the
-// 256 levels of each channel, when they are non-decreasing and not flat. A grid placed
-// evenly along these curves puts its nodes where the profile's own table has them, so
-// the chain bends less inside each cell.
+bool Increasing(const std::vector<double>& curves, unsigned n) {
+  for (unsigned a = 0; a < n; ++a) {
+    const double* c = &curves[a * 256];
+    if (!(c[255] > c[0])) return false;
+    for (int v = 1; v < 256; ++v) {
+      if (c[v] < c[v - 1]) return false;
+    }
+  }
+  return true;
+}
+
+// The input curves of the first profile, sampled at the 256 levels of each channel,
+// when they are non-decreasing and not flat: those that begin its device-to-PCS table,
+// or the curves of an RGB matrix-shaper without one. A grid placed evenly along these
+// curves puts its nodes where the profile's own table has them, or evenly in linear
+// light, so the chain bends less inside each cell.
 bool InputCurves(const Chain& chain, unsigned n, std::vector<double>& curves) {
   cmsHPROFILE p = chain.profiles().front();
   if (cmsIsTag(p, cmsSigDToB0Tag)) return false;  // float tables take precedence in Little CMS
   const cmsUInt32Number intent = chain.intents().front();
   cmsTagSignature tag = static_cast<cmsTagSignature>(cmsSigAToB0Tag + (intent == INTENT_ABSOLUTE_COLORIMETRIC ? 1 : intent));
   if (!cmsIsTag(p, tag)) tag = cmsSigAToB0Tag;
+  curves.assign(n * 256, 0.0);
+  if (!cmsIsTag(p, tag)) {
+    if (n != 3 || !cmsIsMatrixShaper(p)) return false;
+    const cmsTagSignature trc[3] = {cmsSigRedTRCTag, cmsSigGreenTRCTag, cmsSigBlueTRCTag};
+    for (unsigned a = 0; a < 3; ++a) {
+      const auto* t = static_cast<const cmsToneCurve*>(cmsReadTag(p, trc[a]));
+      if (!t) return false;
+      for (int v = 0; v < 256; ++v) curves[a * 256 + v] = cmsEvalToneCurveFloat(t, static_cast<cmsFloat32Number>(v / 255.0));
+    }
+    return Increasing(curves, n);
+  }
   const auto* table = static_cast<const cmsPipeline*>(cmsReadTag(p, tag));
   if (!table) return false;
   cmsStage* first = cmsPipelineGetPtrToFirstStage(table);
@@ -82,7 +105,6 @@ bool InputCurves(const Chain& chain, unsigned n, std::vector<double>& curves) {
     if (alone) cmsPipelineFree(alone);
     return false;
   }
-  curves.assign(n * 256, 0.0);
   for (int v = 0; v < 256; ++v) {
     cmsFloat32Number in[cmsMAXCHANNELS], out[cmsMAXCHANNELS];
     for (unsigned a = 0; a < n; ++a) in[a] = static_cast<cmsFloat32Number>(v / 255.0);
@@ -90,24 +112,19 @@ bool InputCurves(const Chain& chain, unsigned n, std::vector<double>& curves) {
     for (unsigned a = 0; a < n; ++a) curves[a * 256 + v] = out[a];
   }
   cmsPipelineFree(alone);
-  for (unsigned a = 0; a < n; ++a) {
-    const double* c = &curves[a * 256];
-    if (!(c[255] > c[0])) return false;
-    for (int v = 1; v < 256; ++v) {
-      if (c[v] < c[v - 1]) return false;
-    }
-  }
-  return true;
+  return Increasing(curves, n);
 }
 
 // Places the grid along each axis: node k where the axis' position reaches k, with
 // positions in grid units for each input level (evenly spaced levels, or along the
 // input curves), and the input value of each node for sampling.
-void PlaceNodes(const std::vector<double>* curves, unsigned n, unsigned grid, std::vector<double>& level_pos,
+void PlaceNodes(const std::vector<double>* curves, const std::vector<unsigned>& grids, std::vector<double>& level_pos,
                 std::vector<double>& node_value) {
+  const size_t n = grids.size();
   level_pos.assign(n * 256, 0.0);
-  node_value.assign(n * grid, 0.0);
+  node_value.assign(n * 256, 0.0);
   for (unsigned a = 0; a < n; ++a) {
+    const unsigned grid = grids[a];
     double* pos = &level_pos[a * 256];
     for (int v = 0; v < 256; ++v) {
       if (!curves) {
@@ -123,41 +140,41 @@ void PlaceNodes(const std::vector<double>* curves, unsigned n, unsigned grid, st
       while (v < 254 && pos[v + 1] < k) ++v;
       const double span = pos[v + 1] - pos[v];
       const double t = span > 0 ? std::clamp((k - pos[v]) / span, 0.0, 1.0) : 0.0;
-      node_value[a * grid + k] = (v + t) / 255.0;
+      node_value[a * 256 + k] = (v + t) / 255.0;
     }
   }
 }
 
-void BuildClut(const Chain& chain, cmsHTRANSFORM exact, unsigned grid, FastPath& fp) {
+// Lays out a grid of `grids[a]` nodes on axis a (axis 0 varies slowest) for `fp`: the
+// node strides, each input level's node offset and weight, and the input values to
+// sample, `in_channels` doubles a node. Nodes follow the input curves when asked and
+// the first profile has them.
+std::vector<double> LayGrid(const Chain& chain, const std::vector<unsigned>& grids, bool follow_curves, FastPath& fp) {
   const unsigned n = fp.in_channels, oc = fp.out_channels;
   std::vector<double> curves, level_pos, node_value;
-  const bool along_curves = n == 4 && InputCurves(chain, n, curves);
-  PlaceNodes(along_curves ? &curves : nullptr, n, grid, level_pos, node_value);
+  const bool along_curves = follow_curves && InputCurves(chain, n, curves);
+  PlaceNodes(along_curves ? &curves : nullptr, grids, level_pos, node_value);
   size_t count = 1;
-  for (unsigned a = 0; a < n; ++a) count *= grid;
-  // Axis 0 varies slowest.
+  for (unsigned g : grids) count *= g;
   std::vector<double> in(count * n);
   for (size_t i = 0; i < count; ++i) {
     size_t rest = i;
     for (unsigned a = n; a-- > 0;) {
-      in[i * n + a] = node_value[a * grid + rest % grid];
-      rest /= grid;
+      in[i * n + a] = node_value[a * 256 + rest % grids[a]];
+      rest /= grids[a];
     }
   }
-  const std::vector<double> out = Sample(exact, in, count, oc);
-  fp.grid = grid;
-  fp.nodes.assign(count * oc + 4, 0);  // room to read the last node as four lanes
-  for (size_t i = 0; i < count * oc; ++i) fp.nodes[i] = Fixed(out[i]);
-
+  fp.grid = grids.front();
   fp.stride.resize(n);
   std::int32_t s = static_cast<std::int32_t>(oc);
   for (unsigned a = n; a-- > 0;) {
     fp.stride[a] = s;
-    s *= static_cast<std::int32_t>(grid);
+    s *= static_cast<std::int32_t>(grids[a]);
   }
   fp.offset.resize(n * 256);
   fp.weight.resize(n * 256);
   for (unsigned a = 0; a < n; ++a) {
+    const int grid = static_cast<int>(grids[a]);
     for (int v = 0; v < 256; ++v) {
       const double pos = std::clamp(level_pos[a * 256 + v], 0.0, grid - 1.0);
       int cell = static_cast<int>(std::floor(pos));
@@ -165,11 +182,21 @@ void BuildClut(const Chain& chain, cmsHTRANSFORM exact, unsigned grid, FastPath&
       if (w == 1 << kWeightBits) ++cell, w = 0;
       // The far end of an axis sits at the far corner of the last cell, so a node's
       // upper neighbour is always inside the grid.
-      if (cell >= static_cast<int>(grid) - 1) cell = static_cast<int>(grid) - 2, w = 1 << kWeightBits;
+      if (cell >= grid - 1) cell = grid - 2, w = 1 << kWeightBits;
       fp.weight[a * 256 + v] = static_cast<std::int16_t>(w);
       fp.offset[a * 256 + v] = cell * fp.stride[a];
     }
   }
+  return in;
+}
+
+void BuildClut(const Chain& chain, cmsHTRANSFORM exact, FastPath& fp) {
+  const unsigned n = fp.in_channels, oc = fp.out_channels;
+  const std::vector<double> in = LayGrid(chain, std::vector<unsigned>(n, n == 3 ? kGrid3 : kGrid4), n == 4, fp);
+  const size_t count = in.size() / n;
+  const std::vector<double> out = Sample(exact, in, count, oc);
+  fp.nodes.assign(count * oc + 4, 0);  // room to read the last node as four lanes
+  for (size_t i = 0; i < count * oc; ++i) fp.nodes[i] = Fixed(out[i]);
 }
 
 // A copy of a matrix-shaper profile whose curves are the identity, so that a chain of
@@ -202,6 +229,96 @@ struct Curves {
   }
 };
 
+const cmsTagSignature kRgbTrc[3] = {cmsSigRedTRCTag, cmsSigGreenTRCTag, cmsSigBlueTRCTag};
+
+// The reverse of a matrix-shaper output profile's curves, as Little CMS makes them.
+bool ReverseOutputCurves(cmsHPROFILE dst, unsigned oc, Curves& out) {
+  for (unsigned k = 0; k < oc; ++k) {
+    const auto* t = static_cast<const cmsToneCurve*>(cmsReadTag(dst, oc == 1 ? cmsSigGrayTRCTag : kRgbTrc[k]));
+    if (!t || !(out.c[k] = cmsReverseToneCurve(t))) return false;
+  }
+  return true;
+}
+
+// Linear values are kept times this scale, which puts sqrt(linear) on the output
+// tables' index with 8 bits of fraction: sqrt(x * S) = sqrt(x) * kShaperSteps * 256.
+constexpr double kLinearScale = double{kShaperSteps} * 256.0 * kShaperSteps * 256.0;
+
+// The output tables: the reversed curves over u = sqrt(linear), fine near black where
+// output curves are steepest.
+void FillShaper(const Curves& out_curves, unsigned oc, FastPath& fp) {
+  fp.limit = static_cast<float>(kLinearScale);
+  fp.shaper.resize(oc * (kShaperSteps + 2));
+  for (unsigned k = 0; k < oc; ++k) {
+    for (unsigned i = 0; i < kShaperSteps + 2; ++i) {
+      const double u = std::min(i, kShaperSteps) / static_cast<double>(kShaperSteps);
+      const double y = cmsEvalToneCurveFloat(out_curves.c[k], static_cast<cmsFloat32Number>(u * u));
+      fp.shaper[k * (kShaperSteps + 2) + i] = static_cast<std::uint16_t>(Fixed(y));
+    }
+  }
+}
+
+cmsHTRANSFORM DoubleTransform(cmsContext ctx, std::vector<cmsHPROFILE> profiles, std::vector<cmsUInt32Number> intents,
+                              unsigned in_n, unsigned out_n) {
+  std::vector<cmsBool> bpc(profiles.size(), FALSE);
+  std::vector<cmsFloat64Number> adaptation(profiles.size(), 1.0);
+  return cmsCreateExtendedTransform(ctx, static_cast<cmsUInt32Number>(profiles.size()), profiles.data(), bpc.data(),
+                                    intents.data(), adaptation.data(), nullptr, 0,
+                                    FLOAT_SH(1) | CHANNELS_SH(in_n) | BYTES_SH(0),
+                                    FLOAT_SH(1) | CHANNELS_SH(out_n) | BYTES_SH(0), cmsFLAGS_NOOPTIMIZE);
+}
+
+// A sampled chain that ends in a matrix-shaper RGB or gray profile, sampled in linear
+// light: the chain with that profile's curves made the identity gives the linear
+// values, unclipped, and the output tables apply the curves after interpolation. It
+// is taken only when the model H(clamp(linear)) reproduces the exact transform at the
+// nodes checked (Little CMS prefers a profile's tables to its curves, for one).
+bool BuildShapedClut(const Chain& chain, cmsHTRANSFORM exact, FastPath& fp) {
+  const unsigned n = fp.in_channels, oc = fp.out_channels;
+  const ChainStep& last = chain.steps().back();
+  cmsHPROFILE dst = chain.profiles().back();
+  if (chain.profiles().size() < 2 || last.to_pcs || (oc != 3 && oc != 1)) return false;
+  if (last.profile_class == cmsSigLinkClass || last.profile_class == cmsSigAbstractClass) return false;
+  Curves out_curves;
+  if (!cmsIsMatrixShaper(dst) || !ReverseOutputCurves(dst, oc, out_curves)) return false;
+  std::vector<cmsHPROFILE> profiles = chain.profiles();
+  profiles.back() = Linearised(chain.context(), dst, oc == 1);
+  if (!profiles.back()) return false;
+  cmsHTRANSFORM linear = DoubleTransform(chain.context(), profiles, chain.intents(), n, oc);
+  cmsCloseProfile(profiles.back());
+  if (!linear) return false;
+
+  const std::vector<unsigned> grids =
+      n == 3 ? std::vector<unsigned>(3, kShapedGrid3)
+             : std::vector<unsigned>{kShapedGridCmy, kShapedGridCmy, kShapedGridCmy, kShapedGridK};
+  const std::vector<double> in = LayGrid(chain, grids, true, fp);
+  const size_t count = in.size() / n;
+  const std::vector<double> lin = Sample(linear, in, count, oc);
+  cmsDeleteTransform(linear);
+
+  // The check: every 61st node (a prime stride, so every axis position is visited).
+  std::vector<double> probe_in;
+  for (size_t i = 0; i < count; i += 61) probe_in.insert(probe_in.end(), &in[i * n], &in[i * n] + n);
+  const size_t probes = probe_in.size() / n;
+  const std::vector<double> truth = Sample(exact, probe_in, probes, oc);
+  for (size_t p = 0; p < probes; ++p) {
+    for (unsigned k = 0; k < oc; ++k) {
+      const double l = std::clamp(lin[p * 61 * oc + k], 0.0, 1.0);
+      const double model = cmsEvalToneCurveFloat(out_curves.c[k], static_cast<cmsFloat32Number>(l));
+      if (std::fabs(std::clamp(model, 0.0, 1.0) - std::clamp(truth[p * oc + k], 0.0, 1.0)) > 1e-4) return false;
+    }
+  }
+
+  fp.kind = n == 3 ? Kind::ShapedClut3 : Kind::ShapedClut4;
+  fp.linear_nodes.assign(count * oc + 4, 0.0f);  // room to read the last node as four lanes
+  for (size_t i = 0; i < count * oc; ++i) {
+    // Far outside the gamut the value only needs to stay outside it.
+    fp.linear_nodes[i] = static_cast<float>(std::clamp(lin[i], -4.0, 4.0) * kLinearScale);
+  }
+  FillShaper(out_curves, oc, fp);
+  return true;
+}
+
 // The matrix-shaper model of a two-profile chain: out_k = H_k((A * lin(in) + b)_k).
 // It is taken only when it reproduces the exact transform at every sample point.
 bool BuildMatrix(const Chain& chain, cmsHTRANSFORM exact, FastPath& fp) {
@@ -215,30 +332,18 @@ bool BuildMatrix(const Chain& chain, cmsHTRANSFORM exact, FastPath& fp) {
   }
   cmsHPROFILE src = profiles[0], dst = profiles[1];
   if (!cmsIsMatrixShaper(src) || !cmsIsMatrixShaper(dst)) return false;
-  const cmsTagSignature rgb_trc[3] = {cmsSigRedTRCTag, cmsSigGreenTRCTag, cmsSigBlueTRCTag};
   const cmsToneCurve* in_curves[3];
   for (int c = 0; c < 3; ++c) {
-    in_curves[c] = static_cast<const cmsToneCurve*>(cmsReadTag(src, rgb_trc[c]));
+    in_curves[c] = static_cast<const cmsToneCurve*>(cmsReadTag(src, kRgbTrc[c]));
     if (!in_curves[c]) return false;
   }
-  Curves out_curves;  // the reverse of the output profile's curves, as Little CMS makes them
-  for (unsigned k = 0; k < oc; ++k) {
-    const auto* t = static_cast<const cmsToneCurve*>(cmsReadTag(dst, oc == 1 ? cmsSigGrayTRCTag : rgb_trc[k]));
-    if (!t || !(out_curves.c[k] = cmsReverseToneCurve(t))) return false;
-  }
+  Curves out_curves;
+  if (!ReverseOutputCurves(dst, oc, out_curves)) return false;
 
   // The linear map between the ends, measured through identity-curve copies.
   cmsContext ctx = chain.context();
   cmsHPROFILE lin[2] = {Linearised(ctx, src, false), Linearised(ctx, dst, oc == 1)};
-  cmsHTRANSFORM middle = nullptr;
-  if (lin[0] && lin[1]) {
-    std::vector<cmsUInt32Number> intents = chain.intents();
-    cmsBool bpc[2] = {FALSE, FALSE};
-    cmsFloat64Number adaptation[2] = {1.0, 1.0};
-    middle = cmsCreateExtendedTransform(ctx, 2, lin, bpc, intents.data(), adaptation, nullptr, 0,
-                                        FLOAT_SH(1) | CHANNELS_SH(3) | BYTES_SH(0),
-                                        FLOAT_SH(1) | CHANNELS_SH(oc) | BYTES_SH(0), cmsFLAGS_NOOPTIMIZE);
-  }
+  cmsHTRANSFORM middle = lin[0] && lin[1] ? DoubleTransform(ctx, {lin[0], lin[1]}, chain.intents(), 3, oc) : nullptr;
   for (cmsHPROFILE p : lin) {
     if (p) cmsCloseProfile(p);
   }
@@ -287,12 +392,8 @@ bool BuildMatrix(const Chain& chain, cmsHTRANSFORM exact, FastPath& fp) {
     }
   }
 
-  // Tables. The scale puts sqrt(linear) on the output table's index with 8 bits of
-  // fraction: sqrt(x * S) = sqrt(x) * kShaperSteps * 256.
-  const double scale = kShaperSteps * 256.0;
-  const double s = scale * scale;
   fp.kind = Kind::Matrix;
-  fp.limit = static_cast<float>(s);
+  const double s = kLinearScale;
   fp.lin.assign(3 * 256 * 4, 0.0f);
   for (int c = 0; c < 3; ++c) {
     for (int v = 0; v < 256; ++v) {
@@ -301,14 +402,7 @@ bool BuildMatrix(const Chain& chain, cmsHTRANSFORM exact, FastPath& fp) {
       }
     }
   }
-  fp.shaper.resize(oc * (kShaperSteps + 2));
-  for (unsigned k = 0; k < oc; ++k) {
-    for (unsigned i = 0; i < kShaperSteps + 2; ++i) {
-      const double u = std::min(i, kShaperSteps) / static_cast<double>(kShaperSteps);
-      const double y = cmsEvalToneCurveFloat(out_curves.c[k], static_cast<cmsFloat32Number>(u * u));
-      fp.shaper[k * (kShaperSteps + 2) + i] = static_cast<std::uint16_t>(Fixed(y));
-    }
-  }
+  FillShaper(out_curves, oc, fp);
   return true;
 }
 
@@ -335,9 +429,9 @@ std::unique_ptr<FastPath> Build(const Chain& chain, cmsHTRANSFORM exact) {
   if (fp->in_channels == 1) {
     fp->kind = Kind::Table1;
     BuildTable1(exact, *fp);
-  } else if (!BuildMatrix(chain, exact, *fp)) {
+  } else if (!BuildMatrix(chain, exact, *fp) && !BuildShapedClut(chain, exact, *fp)) {
     fp->kind = fp->in_channels == 3 ? Kind::Clut3 : Kind::Clut4;
-    BuildClut(chain, exact, fp->in_channels == 3 ? kGrid3 : kGrid4, *fp);
+    BuildClut(chain, exact, *fp);
   }
   fp->build_ms = std::chrono::duration<double, std::milli>(std::chrono::steady_clock::now() - start).count();
   return fp;

@@ -10,6 +10,13 @@
 //     a grid, read with tetrahedral (3 inputs) or 4-D simplex (CMYK) interpolation in
 //     fixed point. A CMYK grid is spaced along the input curves of the first profile's
 //     table where it has them.
+//   - sampled chains that end in a matrix-shaper RGB or gray profile are sampled in
+//     linear light instead, as floats, and read through that profile's output tables
+//     like the matrix-shaper path: the output curve is steep near black and the chain
+//     clips where colours leave the output gamut, and neither bends between nodes
+//     when it is applied after the interpolation. CMYK is interpolated as Little CMS
+//     does, tetrahedrally in C, M, Y and linearly between two K planes, so a grid that
+//     follows the input table's nodes reproduces it exactly.
 // Every instruction set (portable scalar, SSE2, AVX2) computes the same integers and
 // the same float operations in the same order, so all give identical bytes.
 #ifndef TINTWELL_WIN32_ICM_KERNELS_FAST_PATH_H
@@ -42,7 +49,7 @@ struct PixelLayout {
   int x;               // offset of the filler byte; -1 when there is none
 };
 
-enum class Kind { Table1, Matrix, Clut3, Clut4 };
+enum class Kind { Table1, Matrix, Clut3, Clut4, ShapedClut3, ShapedClut4 };
 enum class Isa { Scalar, Sse2, Avx2 };
 
 // Output tables of the matrix-shaper path: entries over u = sqrt(linear) in [0, 1].
@@ -50,6 +57,11 @@ constexpr unsigned kShaperSteps = 4096;
 // Grid points per axis of the sampled chains.
 constexpr unsigned kGrid3 = 52;
 constexpr unsigned kGrid4 = 17;
+// In linear light: RGB grids along the input curves; CMYK grids with C, M and Y on
+// three nodes for each cell of a 9-point input table, K on two.
+constexpr unsigned kShapedGrid3 = 33;
+constexpr unsigned kShapedGridCmy = 25;
+constexpr unsigned kShapedGridK = 17;
 // Fixed point: grid and table values carry 7 fractional bits of an output level (255
 // fits a signed 16-bit lane), interpolation weights 14 bits.
 constexpr int kValueBits = 7;
@@ -65,17 +77,21 @@ struct FastPath {
 
   // Matrix: lin[c][v] is column c of the matrix times the linearised level v, as
   // four floats (the last unused), scaled so that the square root lands on the output
-  // tables' fixed-point index; the offset is folded into channel 0.
+  // tables' fixed-point index; the offset is folded into channel 0. The output tables
+  // (and the clamp of the scaled linear value) serve the ShapedClut kinds too.
   std::vector<float> lin;         // 3 * 256 * 4
-  float limit = 0;                // clamp for the scaled linear value
+  float limit = 0;
   std::vector<std::uint16_t> shaper;  // out_channels * (kShaperSteps + 2)
 
   // Clut3 / Clut4: nodes of out_channels signed 16-bit values (padded at the end so
   // any node can be read as 8 bytes), and per input level its node offset on each
-  // axis and its weight within the cell.
+  // axis and its weight within the cell. ShapedClut3 / ShapedClut4 keep their nodes
+  // as scaled linear values in linear_nodes (padded so any node reads as 16 bytes)
+  // and end through `limit` and `shaper`.
   unsigned grid = 0;
   std::vector<std::int16_t> nodes;
-  std::vector<std::int32_t> offset;  // in_channels * 256, in int16 units
+  std::vector<float> linear_nodes;
+  std::vector<std::int32_t> offset;  // in_channels * 256, in node values
   std::vector<std::int32_t> stride;  // in_channels
   std::vector<std::int16_t> weight;  // in_channels * 256
 

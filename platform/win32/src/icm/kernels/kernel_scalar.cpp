@@ -25,6 +25,12 @@ void RunScalar(const FastPath& p, const std::uint8_t* src, const PixelLayout& in
       return Each(src, in, dst, out, n, [&](const std::uint8_t* s, std::uint8_t* d) { ops::ClutPixel<3>(p, s, in, d, out); });
     case Kind::Clut4:
       return Each(src, in, dst, out, n, [&](const std::uint8_t* s, std::uint8_t* d) { ops::ClutPixel<4>(p, s, in, d, out); });
+    case Kind::ShapedClut3:
+      return Each(src, in, dst, out, n,
+                  [&](const std::uint8_t* s, std::uint8_t* d) { ops::ShapedClutPixel<3>(p, s, in, d, out); });
+    case Kind::ShapedClut4:
+      return Each(src, in, dst, out, n,
+                  [&](const std::uint8_t* s, std::uint8_t* d) { ops::ShapedClutPixel<4>(p, s, in, d, out); });
   }
 }
 

@@ -71,6 +71,44 @@ inline void ClutPixelSse2(const FastPath& p, const std::uint8_t* s, const PixelL
   PutBytes(static_cast<std::uint32_t>(_mm_cvtsi128_si32(bytes)), x, out, d, p.out_channels);
 }
 
+inline __m128 TetraSse2(const float* c0, const ops::Simplex<3>& sx, const __m128* w) {
+  const float* c1 = c0 + sx.step[0];
+  const float* c2 = c1 + sx.step[1];
+  const float* c3 = c2 + sx.step[2];
+  const __m128 n0 = _mm_loadu_ps(c0), n1 = _mm_loadu_ps(c1), n2 = _mm_loadu_ps(c2), n3 = _mm_loadu_ps(c3);
+  __m128 v = _mm_add_ps(n0, _mm_mul_ps(_mm_sub_ps(n1, n0), w[0]));
+  v = _mm_add_ps(v, _mm_mul_ps(_mm_sub_ps(n2, n1), w[1]));
+  return _mm_add_ps(v, _mm_mul_ps(_mm_sub_ps(n3, n2), w[2]));
+}
+
+// The scalar ShapedClutPixel with the channels side by side.
+template <unsigned N>
+inline void ShapedClutPixelSse2(const FastPath& p, const std::uint8_t* s, const PixelLayout& in, std::uint8_t* d,
+                                const PixelLayout& out, __m128 limit) {
+  std::int32_t base;
+  const ops::Simplex<3> sx = ops::Locate<3>(p, s, in, base);
+  const __m128 w[3] = {_mm_set1_ps(sx.w[0] * ops::kUnitWeight), _mm_set1_ps(sx.w[1] * ops::kUnitWeight),
+                       _mm_set1_ps(sx.w[2] * ops::kUnitWeight)};
+  const std::uint8_t x = ops::FillerOf(s, in);
+  std::int32_t k_step = 0;
+  float k_weight = 0.0f;
+  if constexpr (N == 4) {
+    const std::uint8_t k_level = s[in.at[3]];
+    base += p.offset[3 * 256 + k_level];
+    k_step = p.stride[3];
+    k_weight = p.weight[3 * 256 + k_level] * ops::kUnitWeight;
+  }
+  const float* c = &p.linear_nodes[base];
+  __m128 v = TetraSse2(c, sx, w);
+  if constexpr (N == 4) v = _mm_add_ps(v, _mm_mul_ps(_mm_sub_ps(TetraSse2(c + k_step, sx, w), v), _mm_set1_ps(k_weight)));
+  v = _mm_min_ps(_mm_max_ps(v, _mm_setzero_ps()), limit);
+  alignas(16) std::uint32_t q[4];
+  _mm_store_si128(reinterpret_cast<__m128i*>(q), _mm_cvttps_epi32(_mm_sqrt_ps(v)));
+  std::uint32_t o = 0;
+  for (unsigned k = 0; k < p.out_channels; ++k) o |= std::uint32_t{ShapeQ(p, k, q[k])} << (8 * k);
+  PutBytes(o, x, out, d, p.out_channels);
+}
+
 template <typename PixelFn>
 inline void Each(const std::uint8_t* src, const PixelLayout& in, std::uint8_t* dst, const PixelLayout& out,
                  std::size_t from, std::size_t n, PixelFn pixel) {
@@ -94,6 +132,16 @@ inline void RunPerPixel(const FastPath& p, const std::uint8_t* src, const PixelL
     case Kind::Clut4:
       return Each(src, in, dst, out, from, n,
                   [&](const std::uint8_t* s, std::uint8_t* d) { ClutPixelSse2<4>(p, s, in, d, out); });
+    case Kind::ShapedClut3:
+    case Kind::ShapedClut4: {
+      const __m128 limit = _mm_set1_ps(p.limit);
+      if (p.kind == Kind::ShapedClut3) {
+        return Each(src, in, dst, out, from, n,
+                    [&](const std::uint8_t* s, std::uint8_t* d) { ShapedClutPixelSse2<3>(p, s, in, d, out, limit); });
+      }
+      return Each(src, in, dst, out, from, n,
+                  [&](const std::uint8_t* s, std::uint8_t* d) { ShapedClutPixelSse2<4>(p, s, in, d, out, limit); });
+    }
   }
 }
 

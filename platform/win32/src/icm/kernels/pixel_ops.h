@@ -91,6 +91,47 @@ inline void ClutPixel(const FastPath& p, const std::uint8_t* s, const PixelLayou
   if (out.x >= 0) d[out.x] = x;
 }
 
+// Tetrahedral interpolation of channel k of float nodes from corner c0 along the
+// sorted steps, with weights scaled to 0..1; every kernel adds in this order.
+inline float Tetra(const float* c0, const Simplex<3>& sx, const float* w, unsigned k) {
+  const float* c1 = c0 + sx.step[0];
+  const float* c2 = c1 + sx.step[1];
+  const float* c3 = c2 + sx.step[2];
+  return ((c0[k] + (c1[k] - c0[k]) * w[0]) + (c2[k] - c1[k]) * w[1]) + (c3[k] - c2[k]) * w[2];
+}
+
+constexpr float kUnitWeight = 1.0f / (1 << kWeightBits);
+
+// A sampled chain in linear light: tetrahedral in the first three channels and, for
+// CMYK, linear between the two K planes; then clamped and shaped.
+template <unsigned N>
+inline void ShapedClutPixel(const FastPath& p, const std::uint8_t* s, const PixelLayout& in, std::uint8_t* d,
+                            const PixelLayout& out) {
+  std::int32_t base;
+  const Simplex<3> sx = Locate<3>(p, s, in, base);
+  const float w[3] = {sx.w[0] * kUnitWeight, sx.w[1] * kUnitWeight, sx.w[2] * kUnitWeight};
+  const std::uint8_t x = FillerOf(s, in);
+  std::int32_t k_step = 0;
+  float k_weight = 0.0f;
+  if constexpr (N == 4) {
+    const std::uint8_t k_level = s[in.at[3]];
+    base += p.offset[3 * 256 + k_level];
+    k_step = p.stride[3];
+    k_weight = p.weight[3 * 256 + k_level] * kUnitWeight;
+  }
+  const float* c = &p.linear_nodes[base];
+  std::uint8_t o[3];
+  for (unsigned k = 0; k < p.out_channels; ++k) {
+    float v = Tetra(c, sx, w, k);
+    if constexpr (N == 4) v = v + (Tetra(c + k_step, sx, w, k) - v) * k_weight;
+    v = v > 0.0f ? v : 0.0f;
+    v = v < p.limit ? v : p.limit;
+    o[k] = Shape(p, k, v);
+  }
+  for (unsigned k = 0; k < p.out_channels; ++k) d[out.at[k]] = o[k];
+  if (out.x >= 0) d[out.x] = x;
+}
+
 inline void Table1Pixel(const FastPath& p, const std::uint8_t* s, const PixelLayout& in, std::uint8_t* d,
                         const PixelLayout& out) {
   const std::uint8_t* t = &p.table[s[in.at[0]] * p.out_channels];
