@@ -81,32 +81,76 @@ inline __m128 TetraSse2(const float* c0, const ops::Simplex<3>& sx, const __m128
   return _mm_add_ps(v, _mm_mul_ps(_mm_sub_ps(n3, n2), w[2]));
 }
 
-// The scalar ShapedClutPixel with the channels side by side.
+// A pixel of a ShapedClut kind once located: its first node, simplex, weights and
+// filler byte.
+struct ShapedCell {
+  const float* c;
+  ops::Simplex<3> sx;
+  std::int32_t k_step;
+  float k_weight;
+  std::uint8_t x;
+};
+
 template <unsigned N>
-inline void ShapedClutPixelSse2(const FastPath& p, const std::uint8_t* s, const PixelLayout& in, std::uint8_t* d,
-                                const PixelLayout& out, __m128 limit) {
+inline ShapedCell LocateShaped(const FastPath& p, const std::uint8_t* s, const PixelLayout& in) {
+  ShapedCell cell;
   std::int32_t base;
-  const ops::Simplex<3> sx = ops::Locate<3>(p, s, in, base);
-  const __m128 w[3] = {_mm_set1_ps(sx.w[0] * ops::kUnitWeight), _mm_set1_ps(sx.w[1] * ops::kUnitWeight),
-                       _mm_set1_ps(sx.w[2] * ops::kUnitWeight)};
-  const std::uint8_t x = ops::FillerOf(s, in);
-  std::int32_t k_step = 0;
-  float k_weight = 0.0f;
+  cell.sx = ops::Locate<3>(p, s, in, base);
+  cell.x = ops::FillerOf(s, in);
+  cell.k_step = 0;
+  cell.k_weight = 0.0f;
   if constexpr (N == 4) {
     const std::uint8_t k_level = s[in.at[3]];
     base += p.offset[3 * 256 + k_level];
-    k_step = p.stride[3];
-    k_weight = p.weight[3 * 256 + k_level] * ops::kUnitWeight;
+    cell.k_step = p.stride[3];
+    cell.k_weight = p.weight[3 * 256 + k_level] * ops::kUnitWeight;
   }
-  const float* c = &p.linear_nodes[base];
-  __m128 v = TetraSse2(c, sx, w);
-  if constexpr (N == 4) v = _mm_add_ps(v, _mm_mul_ps(_mm_sub_ps(TetraSse2(c + k_step, sx, w), v), _mm_set1_ps(k_weight)));
+  cell.c = &p.linear_nodes[base];
+  return cell;
+}
+
+// The scalar ShapedClutPixel with the channels side by side.
+template <unsigned N>
+inline void ShapedPixelSse2(const FastPath& p, const ShapedCell& cell, std::uint8_t* d, const PixelLayout& out,
+                            __m128 limit) {
+  const ops::Simplex<3>& sx = cell.sx;
+  const __m128 w[3] = {_mm_set1_ps(sx.w[0] * ops::kUnitWeight), _mm_set1_ps(sx.w[1] * ops::kUnitWeight),
+                       _mm_set1_ps(sx.w[2] * ops::kUnitWeight)};
+  __m128 v = TetraSse2(cell.c, sx, w);
+  if constexpr (N == 4) {
+    v = _mm_add_ps(v, _mm_mul_ps(_mm_sub_ps(TetraSse2(cell.c + cell.k_step, sx, w), v), _mm_set1_ps(cell.k_weight)));
+  }
   v = _mm_min_ps(_mm_max_ps(v, _mm_setzero_ps()), limit);
   alignas(16) std::uint32_t q[4];
   _mm_store_si128(reinterpret_cast<__m128i*>(q), _mm_cvttps_epi32(_mm_sqrt_ps(v)));
   std::uint32_t o = 0;
   for (unsigned k = 0; k < p.out_channels; ++k) o |= std::uint32_t{ShapeQ(p, k, q[k])} << (8 * k);
-  PutBytes(o, x, out, d, p.out_channels);
+  PutBytes(o, cell.x, out, d, p.out_channels);
+}
+
+// Linear-light tables run to megabytes, so most pixels miss the cache: a block of
+// pixels is located first, with the corners of each cell fetched ahead, and then
+// interpolated, so that the misses of the block overlap. Every pixel of a block is
+// read before any is written, as in-place conversion needs.
+template <unsigned N>
+void ShapedBlocksSse2(const FastPath& p, const std::uint8_t* src, const PixelLayout& in, std::uint8_t* dst,
+                      const PixelLayout& out, std::size_t n) {
+  constexpr std::size_t kBlock = 32;
+  const __m128 limit = _mm_set1_ps(p.limit);
+  ShapedCell cells[kBlock];
+  for (std::size_t i = 0; i < n; i += kBlock) {
+    const std::size_t m = n - i < kBlock ? n - i : kBlock;
+    for (std::size_t j = 0; j < m; ++j) {
+      const ShapedCell& cell = cells[j] = LocateShaped<N>(p, src + (i + j) * in.bytes, in);
+      const float* corner = cell.c;
+      for (unsigned t = 0; t < 4; ++t) {
+        _mm_prefetch(reinterpret_cast<const char*>(corner), _MM_HINT_T0);
+        if constexpr (N == 4) _mm_prefetch(reinterpret_cast<const char*>(corner + cell.k_step + 3), _MM_HINT_T0);
+        if (t < 3) corner += cell.sx.step[t];
+      }
+    }
+    for (std::size_t j = 0; j < m; ++j) ShapedPixelSse2<N>(p, cells[j], dst + (i + j) * out.bytes, out, limit);
+  }
 }
 
 template <typename PixelFn>
@@ -133,15 +177,9 @@ inline void RunPerPixel(const FastPath& p, const std::uint8_t* src, const PixelL
       return Each(src, in, dst, out, from, n,
                   [&](const std::uint8_t* s, std::uint8_t* d) { ClutPixelSse2<4>(p, s, in, d, out); });
     case Kind::ShapedClut3:
-    case Kind::ShapedClut4: {
-      const __m128 limit = _mm_set1_ps(p.limit);
-      if (p.kind == Kind::ShapedClut3) {
-        return Each(src, in, dst, out, from, n,
-                    [&](const std::uint8_t* s, std::uint8_t* d) { ShapedClutPixelSse2<3>(p, s, in, d, out, limit); });
-      }
-      return Each(src, in, dst, out, from, n,
-                  [&](const std::uint8_t* s, std::uint8_t* d) { ShapedClutPixelSse2<4>(p, s, in, d, out, limit); });
-    }
+      return ShapedBlocksSse2<3>(p, src + from * in.bytes, in, dst + from * out.bytes, out, n - from);
+    case Kind::ShapedClut4:
+      return ShapedBlocksSse2<4>(p, src + from * in.bytes, in, dst + from * out.bytes, out, n - from);
   }
 }
 
