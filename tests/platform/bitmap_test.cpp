@@ -196,6 +196,15 @@ TEST_F(BitmapTest, ThreadsGiveTheSameBytes) {
                                     nullptr, 0));
   }
   EXPECT_TRUE(one == two);
+  // In place onto smaller pixels, shares may not cut rows: a pixel's output overwrites
+  // the input of earlier pixels in its row.
+  Xform back({cmyk_.get(), srgb_.get()}, {kRel, kRel});
+  std::vector<BYTE> quads = Noise(size_t{w} * 4 * h, 12), apart(quads.size());
+  ASSERT_TRUE(TranslateBitmapBits(back.get(), quads.data(), BM_KYMCQUADS, w, h, w * 4, apart.data(), BM_RGBTRIPLETS,
+                                  w * 4, nullptr, 0));
+  ASSERT_TRUE(TranslateBitmapBits(back.get(), quads.data(), BM_KYMCQUADS, w, h, w * 4, quads.data(), BM_RGBTRIPLETS,
+                                  w * 4, nullptr, 0));
+  for (DWORD r = 0; r < h; ++r) ASSERT_EQ(0, std::memcmp(&quads[r * w * 4], &apart[r * w * 4], w * 3)) << r;
   std::vector<BYTE> rgb;  // the first row, R, G, B
   for (DWORD i = 0; i < w; ++i) rgb.insert(rgb.end(), {src[i * 3 + 2], src[i * 3 + 1], src[i * 3]});
   ExpectNear(std::vector<BYTE>(one.begin(), one.begin() + w * 4), Exact({"sRGB.icc", cmyk_name_}, 3, 4, rgb), 10);

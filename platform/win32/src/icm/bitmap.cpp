@@ -195,25 +195,25 @@ extern "C" BOOL WINAPI TranslateBitmapBits(HTRANSFORM hColorTransform, PVOID pSr
       if (workers == 1) {
         job.Pixels(begin, end);
       } else {
-        // Equal shares of pixels, cut at row ends unless rows may be split.
-        std::vector<size_t> cut(workers + 1);
-        for (unsigned w = 0; w <= workers; ++w) {
-          size_t at = begin + (end - begin) * w / workers;
-          if (!split_rows) at = std::min(end, (at + width / 2) / width * width);
-          cut[w] = std::max(at, w ? cut[w - 1] : begin);
-        }
-        cut[workers] = end;
+        // The band is taken a chunk at a time, so a core that runs slower (or is taken
+        // away for a while) converts less of it rather than holding up the others.
+        // Chunks are whole rows unless rows may be split.
+        size_t chunk = std::clamp<size_t>((end - begin) / (size_t{workers} * 8), 4096, 65536);
+        if (!split_rows) chunk = std::max<size_t>(1, chunk / width) * width;
+        std::atomic<size_t> next{begin};
+        const auto share = [&job, &next, chunk, end] {
+          for (size_t from; (from = next.fetch_add(chunk)) < end;) job.Pixels(from, std::min(end, from + chunk));
+        };
         std::vector<std::thread> pool;
         pool.reserve(workers);  // no reallocation once threads run
         for (unsigned w = 1; w < workers; ++w) {
-          if (cut[w] == cut[w + 1]) continue;
           try {
-            pool.emplace_back([&job, from = cut[w], to = cut[w + 1]] { job.Pixels(from, to); });
+            pool.emplace_back(share);
           } catch (const std::system_error&) {
-            job.Pixels(cut[w], cut[w + 1]);  // no thread to spare: do this share here
+            break;  // no thread to spare: the others take its chunks
           }
         }
-        job.Pixels(cut[0], cut[1]);
+        share();
         for (std::thread& th : pool) th.join();
       }
       if (pfnCallBack && !pfnCallBack(dwHeight, static_cast<ULONG>(first + rows), ulCallbackData)) {
