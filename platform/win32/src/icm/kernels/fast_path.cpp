@@ -429,7 +429,8 @@ std::unique_ptr<FastPath> Build(const Chain& chain, cmsHTRANSFORM exact) {
   if (fp->in_channels == 1) {
     fp->kind = Kind::Table1;
     BuildTable1(exact, *fp);
-  } else if (!BuildMatrix(chain, exact, *fp) && !BuildShapedClut(chain, exact, *fp)) {
+  } else if (!BuildMatrix(chain, exact, *fp) && !BuildShapedClut(chain, exact, *fp) &&
+             !(fp->in_channels == 3 && detail::BuildStaged(chain, exact, *fp))) {
     fp->kind = fp->in_channels == 3 ? Kind::Clut3 : Kind::Clut4;
     BuildClut(chain, exact, *fp);
   }

@@ -9,14 +9,18 @@
 //   - everything else (RGB or CMYK in): the whole chain sampled in double precision on
 //     a grid, read with tetrahedral (3 inputs) or 4-D simplex (CMYK) interpolation in
 //     fixed point. A CMYK grid is spaced along the input curves of the first profile's
-//     table where it has them.
+//     table where it has them;
 //   - sampled chains that end in a matrix-shaper RGB or gray profile are sampled in
 //     linear light instead, as floats, and read through that profile's output tables
 //     like the matrix-shaper path: the output curve is steep near black and the chain
 //     clips where colours leave the output gamut, and neither bends between nodes
 //     when it is applied after the interpolation. CMYK is interpolated as Little CMS
 //     does, tetrahedrally in C, M, Y and linearly between two K planes, so a grid that
-//     follows the input table's nodes reproduces it exactly.
+//     follows the input table's nodes reproduces it exactly;
+//   - RGB into an output profile whose PCS-to-device table is a Lab-indexed CLUT
+//     (staged): the smooth part up to that table's input curves sampled on an RGB grid
+//     and read tetrahedrally, then the table's own curves, nodes and trilinear
+//     interpolation, whose cell-by-cell kinks no sampled grid could follow.
 // Every instruction set (portable scalar, SSE2, AVX2) computes the same integers and
 // the same float operations in the same order, so all give identical bytes.
 #ifndef TINTWELL_WIN32_ICM_KERNELS_FAST_PATH_H
@@ -49,7 +53,7 @@ struct PixelLayout {
   int x;               // offset of the filler byte; -1 when there is none
 };
 
-enum class Kind { Table1, Matrix, Clut3, Clut4, ShapedClut3, ShapedClut4 };
+enum class Kind { Table1, Matrix, Clut3, Clut4, ShapedClut3, ShapedClut4, Staged };
 enum class Isa { Scalar, Sse2, Avx2 };
 
 // Output tables of the matrix-shaper path: entries over u = sqrt(linear) in [0, 1].
@@ -97,7 +101,26 @@ struct FastPath {
 
   // Milliseconds spent building, for the benchmark's report.
   double build_ms = 0;
+
+  // Staged: grid, nodes, offset, stride and weight (as Clut3) give stage 1, the place
+  // on each input curve of the output table (in 1/256 of a curve step, less the middle
+  // 255 * 128 and halved, three of four lanes a node). Stage 2 is that table: per input
+  // curve its 257 points (the last repeated) as positions in the table's grid with
+  // kClutFracBits of fraction; its nodes (four int16 lanes a node, output levels with
+  // kValueBits of fraction), each axis' last plane repeated so that the far end is a
+  // cell corner like any other; per output curve the byte at every such value.
+  std::vector<std::int32_t> in_curve;    // 3 * 257
+  std::vector<std::int16_t> clut;        // clut_size[0..2] nodes * 4, plus padding
+  std::int32_t clut_size[3] = {};        // nodes per axis, the repeated plane included
+  std::int32_t clut_stride[3] = {};      // in int16 units
+  std::vector<std::uint8_t> out_level;   // out_channels * ((255 << kValueBits) + 1)
+  // Stage 1's node offset / 4 << 15 | weight, per axis and level: one read for both.
+  std::vector<std::int32_t> cell;        // 3 * 256
 };
+
+// Staged paths: the fraction bits of a position in the output table's grid (the
+// interpolation weight itself).
+constexpr int kClutFracBits = kWeightBits;
 
 // The fast path for a chain whose double-precision transform (device values 0..1 in
 // and out) is `exact`; null when the chain's ends are not 8-bit bitmap spaces. Sampling
@@ -118,6 +141,10 @@ bool IsaAvailable(Isa isa);
 
 // One kernel per instruction set; Run picks among them.
 namespace detail {
+// Makes `fp` a staged path when the chain allows one and the composition reproduces
+// the exact transform; false (fp untouched but for scratch) otherwise.
+bool BuildStaged(const Chain& chain, cmsHTRANSFORM exact, FastPath& fp);
+
 void RunScalar(const FastPath& path, const std::uint8_t* src, const PixelLayout& in, std::uint8_t* dst,
                const PixelLayout& out, std::size_t n);
 #ifdef TINTWELL_KERNELS_X86

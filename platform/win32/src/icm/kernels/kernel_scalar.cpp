@@ -31,6 +31,8 @@ void RunScalar(const FastPath& p, const std::uint8_t* src, const PixelLayout& in
     case Kind::ShapedClut4:
       return Each(src, in, dst, out, n,
                   [&](const std::uint8_t* s, std::uint8_t* d) { ops::ShapedClutPixel<4>(p, s, in, d, out); });
+    case Kind::Staged:
+      return Each(src, in, dst, out, n, [&](const std::uint8_t* s, std::uint8_t* d) { ops::StagedPixel(p, s, in, d, out); });
   }
 }
 

@@ -1,7 +1,9 @@
 // The x86 kernels: SSE2 (every x86-64 has it) works a pixel at a time with the
 // pixel's channels side by side in one register; AVX2, chosen at run time, converts
-// matrix-shaper runs eight pixels at a time with gathers. Both end a run with the
-// per-pixel steps the scalar kernel uses.
+// matrix-shaper runs eight pixels at a time with gathers, and does the staged path's
+// table reads eight pixels at a time and its trilinear step two at a time. Linear-light
+// and staged pixels go in blocks, so that the cache misses of a block overlap. Every
+// kernel ends a run with the per-pixel steps the scalar kernel uses.
 #include "icm/kernels/fast_path.h"
 
 #ifdef TINTWELL_KERNELS_X86
@@ -153,6 +155,119 @@ void ShapedBlocksSse2(const FastPath& p, const std::uint8_t* src, const PixelLay
   }
 }
 
+// lo + (hi - lo) * w in eight 16-bit lanes, as ops::Lerp; pw holds (2^14, w) pairs.
+inline __m128i Lerp8(__m128i lo, __m128i hi, __m128i pw) {
+  const __m128i d = _mm_sub_epi16(hi, lo);
+  const __m128i r = _mm_set1_epi32(1 << (kWeightBits - 1));
+  const __m128i a = _mm_srai_epi32(_mm_add_epi32(_mm_madd_epi16(_mm_unpacklo_epi16(lo, d), pw), r), kWeightBits);
+  const __m128i b = _mm_srai_epi32(_mm_add_epi32(_mm_madd_epi16(_mm_unpackhi_epi16(lo, d), pw), r), kWeightBits);
+  return _mm_packs_epi32(a, b);
+}
+
+inline __m128i WeightPair(std::int32_t w) { return _mm_set1_epi32((w << 16) | (1 << kWeightBits)); }
+
+// The staged pixels of ops::StagedPixel, a block at a time in four passes (stage 1,
+// input curves, the table's trilinear step, output curves): each pass is a short chain
+// of dependent steps, so the processor overlaps many pixels. A block is read before
+// any of it is written.
+constexpr std::size_t kStagedBlock = 64;
+constexpr std::int16_t kCurveMid = 255 * 128;
+
+struct StagedBlock {
+  alignas(32) std::int32_t t[3][kStagedBlock];  // curve positions, axis by axis
+  alignas(16) std::int16_t v[kStagedBlock][4];  // the table's values
+  alignas(32) std::int32_t at[kStagedBlock];    // node offset of the cell
+  alignas(32) std::int32_t w[3][kStagedBlock];  // its weights, axis by axis
+  std::uint8_t fill[kStagedBlock];
+};
+
+inline void StagedCurvePositions(const FastPath& p, const std::uint8_t* src, const PixelLayout& in, std::size_t m,
+                                 StagedBlock& b, std::size_t from = 0) {
+  const auto pair = [](std::int32_t lo, std::int32_t hi) { return _mm_set1_epi32((hi << 16) | lo); };
+  const __m128i lo = _mm_set1_epi16(-kCurveMid), hi = _mm_set1_epi16(kCurveMid);
+  for (std::size_t j = from; j < m; ++j) {
+    const std::uint8_t* s = src + j * in.bytes;
+    std::int32_t base;
+    const ops::Simplex<3> sx = ops::Locate<3>(p, s, in, base);
+    b.fill[j] = ops::FillerOf(s, in);
+    const std::int16_t* c = &p.nodes[base];
+    __m128i q[4];
+    q[0] = _mm_loadl_epi64(reinterpret_cast<const __m128i*>(c));
+    for (unsigned k = 0; k < 3; ++k) {
+      c += sx.step[k];
+      q[k + 1] = _mm_loadl_epi64(reinterpret_cast<const __m128i*>(c));
+    }
+    __m128i acc = _mm_madd_epi16(_mm_unpacklo_epi16(q[0], _mm_sub_epi16(q[1], q[0])), pair(1 << kWeightBits, sx.w[0]));
+    acc = _mm_add_epi32(acc, _mm_madd_epi16(_mm_unpacklo_epi16(_mm_sub_epi16(q[2], q[1]), _mm_sub_epi16(q[3], q[2])),
+                                            pair(sx.w[1], sx.w[2])));
+    acc = _mm_srai_epi32(_mm_add_epi32(acc, _mm_set1_epi32(1 << (kWeightBits - 2))), kWeightBits - 1);
+    const __m128i clipped = _mm_min_epi16(_mm_max_epi16(_mm_packs_epi32(acc, acc), lo), hi);
+    b.t[0][j] = static_cast<std::int16_t>(_mm_extract_epi16(clipped, 0)) + kCurveMid;
+    b.t[1][j] = static_cast<std::int16_t>(_mm_extract_epi16(clipped, 1)) + kCurveMid;
+    b.t[2][j] = static_cast<std::int16_t>(_mm_extract_epi16(clipped, 2)) + kCurveMid;
+  }
+}
+
+inline void StagedCells(const FastPath& p, std::size_t m, StagedBlock& b, std::size_t from = 0) {
+  for (std::size_t j = from; j < m; ++j) {
+    std::int32_t o[3];
+    for (unsigned a = 0; a < 3; ++a) ops::ClutAxis(p, a, b.t[a][j], o[a], b.w[a][j]);
+    b.at[j] = o[0] + o[1] + o[2];
+  }
+}
+
+inline void StagedTrilinearSse2(const FastPath& p, std::size_t m, StagedBlock& b, std::size_t from = 0) {
+  const auto load = [](const std::int16_t* a) { return _mm_loadu_si128(reinterpret_cast<const __m128i*>(a)); };
+  const std::int32_t sx = p.clut_stride[0], sy = p.clut_stride[1];
+  for (std::size_t j = from; j < m; ++j) {
+    const std::int16_t* q = &p.clut[b.at[j]];
+    const __m128i wx = WeightPair(b.w[0][j]);
+    const __m128i x0 = Lerp8(load(q), load(q + sx), wx);            // x00 | x01
+    const __m128i x1 = Lerp8(load(q + sy), load(q + sx + sy), wx);  // x10 | x11
+    const __m128i y = Lerp8(x0, x1, WeightPair(b.w[1][j]));         // y0 | y1
+    _mm_storel_epi64(reinterpret_cast<__m128i*>(b.v[j]), Lerp8(y, _mm_srli_si128(y, 8), WeightPair(b.w[2][j])));
+  }
+}
+
+// Output curves, and the bytes in place: as one 32-bit word when the pixel is four
+// bytes that all get written.
+inline void StagedOutput(const FastPath& p, const PixelLayout& out, std::uint8_t* dst, std::size_t m,
+                         const StagedBlock& b) {
+  const unsigned oc = p.out_channels;
+  if (out.bytes == 4 && (oc == 4 || (oc == 3 && out.x >= 0))) {
+    unsigned shift[4];
+    for (unsigned k = 0; k < oc; ++k) shift[k] = 8 * out.at[k];
+    const unsigned xs = out.x >= 0 ? 8 * out.x : 0;
+    const std::uint8_t* table[4];
+    for (unsigned k = 0; k < oc; ++k) table[k] = &p.out_level[k * ((255 << kValueBits) + 1)];
+    for (std::size_t j = 0; j < m; ++j) {
+      std::uint32_t o = out.x >= 0 ? std::uint32_t{b.fill[j]} << xs : 0;
+      for (unsigned k = 0; k < oc; ++k) o |= std::uint32_t{table[k][b.v[j][k]]} << shift[k];
+      std::memcpy(dst + j * 4, &o, 4);
+    }
+    return;
+  }
+  for (std::size_t j = 0; j < m; ++j) {
+    std::uint32_t o = 0;
+    for (unsigned k = 0; k < oc; ++k) o |= std::uint32_t{ops::OutLevel(p, k, b.v[j][k])} << (8 * k);
+    PutBytes(o, b.fill[j], out, dst + j * out.bytes, oc);
+  }
+}
+
+template <typename Positions, typename Cells, typename Trilinear>
+inline void StagedRun(const FastPath& p, const std::uint8_t* src, const PixelLayout& in, std::uint8_t* dst,
+                      const PixelLayout& out, std::size_t from, std::size_t n, Positions positions, Cells cells,
+                      Trilinear trilinear) {
+  StagedBlock b;
+  for (std::size_t i = from; i < n; i += kStagedBlock) {
+    const std::size_t m = n - i < kStagedBlock ? n - i : kStagedBlock;
+    positions(p, src + i * in.bytes, in, m, n - i, b);
+    cells(p, m, b);
+    trilinear(p, m, b);
+    StagedOutput(p, out, dst + i * out.bytes, m, b);
+  }
+}
+
 template <typename PixelFn>
 inline void Each(const std::uint8_t* src, const PixelLayout& in, std::uint8_t* dst, const PixelLayout& out,
                  std::size_t from, std::size_t n, PixelFn pixel) {
@@ -180,6 +295,13 @@ inline void RunPerPixel(const FastPath& p, const std::uint8_t* src, const PixelL
       return ShapedBlocksSse2<3>(p, src + from * in.bytes, in, dst + from * out.bytes, out, n - from);
     case Kind::ShapedClut4:
       return ShapedBlocksSse2<4>(p, src + from * in.bytes, in, dst + from * out.bytes, out, n - from);
+    case Kind::Staged:
+      return StagedRun(
+          p, src, in, dst, out, from, n,
+          [](const FastPath& q, const std::uint8_t* s, const PixelLayout& l, std::size_t m, std::size_t,
+             StagedBlock& b) { StagedCurvePositions(q, s, l, m, b); },
+          [](const FastPath& q, std::size_t m, StagedBlock& b) { StagedCells(q, m, b); },
+          [](const FastPath& q, std::size_t m, StagedBlock& b) { StagedTrilinearSse2(q, m, b); });
   }
 }
 
@@ -248,6 +370,172 @@ __attribute__((target("avx2"))) void MatrixAvx2(const FastPath& p, const std::ui
   done = i;
 }
 
+// The trilinear step of StagedTrilinearSse2 for two pixels at once, one in each half.
+__attribute__((target("avx2"))) inline __m256i Lerp16(__m256i lo, __m256i hi, __m256i pw) {
+  const __m256i d = _mm256_sub_epi16(hi, lo);
+  const __m256i r = _mm256_set1_epi32(1 << (kWeightBits - 1));
+  const __m256i a =
+      _mm256_srai_epi32(_mm256_add_epi32(_mm256_madd_epi16(_mm256_unpacklo_epi16(lo, d), pw), r), kWeightBits);
+  const __m256i b =
+      _mm256_srai_epi32(_mm256_add_epi32(_mm256_madd_epi16(_mm256_unpackhi_epi16(lo, d), pw), r), kWeightBits);
+  return _mm256_packs_epi32(a, b);
+}
+
+__attribute__((target("avx2"))) inline __m256i Load2(const std::int16_t* a0, const std::int16_t* a1) {
+  return _mm256_inserti128_si256(_mm256_castsi128_si256(_mm_loadu_si128(reinterpret_cast<const __m128i*>(a0))),
+                                 _mm_loadu_si128(reinterpret_cast<const __m128i*>(a1)), 1);
+}
+
+__attribute__((target("avx2"))) inline __m256i WeightPairs(std::int32_t w0, std::int32_t w1) {
+  const std::int32_t a = (w0 << 16) | (1 << kWeightBits), c = (w1 << 16) | (1 << kWeightBits);
+  return _mm256_setr_epi32(a, a, a, a, c, c, c, c);
+}
+
+// The byte shuffle that puts channel c (or the filler, c = 3) of four pixels in the low
+// bytes of four dwords, for each 128-bit half.
+__attribute__((target("avx2"))) inline __m256i LevelShuffle(const PixelLayout& in, int c) {
+  alignas(16) std::int8_t m[16];
+  for (int k = 0; k < 16; ++k) m[k] = -128;
+  const int at = c < 3 ? in.at[c] : in.x;
+  for (int px = 0; px < 4; ++px) m[px * 4] = static_cast<std::int8_t>(px * static_cast<int>(in.bytes) + at);
+  return _mm256_broadcastsi128_si256(_mm_load_si128(reinterpret_cast<const __m128i*>(m)));
+}
+
+// Stage 1 of StagedCurvePositions for eight pixels at once: two 16-byte reads hold
+// them (groups stop while those stay inside the run), gathers read the tables.
+__attribute__((target("avx2"))) void StagedCurvePositionsAvx2(const FastPath& p, const std::uint8_t* src,
+                                                               const PixelLayout& in, std::size_t m, std::size_t avail,
+                                                               StagedBlock& b) {
+  const __m256i level_of[3] = {LevelShuffle(in, 0), LevelShuffle(in, 1), LevelShuffle(in, 2)};
+  const __m256i filler_of = LevelShuffle(in, in.x >= 0 ? 3 : 0);
+  const __m256i wmask = _mm256_set1_epi32((1 << 15) - 1);
+  const __m256i stride[3] = {_mm256_set1_epi32(p.stride[0] / 4), _mm256_set1_epi32(p.stride[1] / 4),
+                             _mm256_set1_epi32(p.stride[2] / 4)};
+  const __m256i all = _mm256_set1_epi32((p.stride[0] + p.stride[1] + p.stride[2]) / 4);
+  const __m256i round = _mm256_set1_epi32(1 << (kWeightBits - 2));
+  const __m256i lo = _mm256_set1_epi32(-kCurveMid), hi = _mm256_set1_epi32(kCurveMid), mid = hi;
+  const auto* nodes64 = reinterpret_cast<const long long*>(p.nodes.data());
+  std::size_t j = 0;
+  for (; j + 8 <= m && (j + 4) * in.bytes + 16 <= avail * in.bytes; j += 8) {
+    const std::uint8_t* s = src + j * in.bytes;
+    const __m256i px = _mm256_inserti128_si256(
+        _mm256_castsi128_si256(_mm_loadu_si128(reinterpret_cast<const __m128i*>(s))),
+        _mm_loadu_si128(reinterpret_cast<const __m128i*>(s + 4 * in.bytes)), 1);
+    __m256i base = _mm256_setzero_si256(), w[3];
+    for (int c = 0; c < 3; ++c) {
+      const __m256i level = _mm256_shuffle_epi8(px, level_of[c]);
+      const __m256i cell = _mm256_i32gather_epi32(p.cell.data() + c * 256, level, 4);
+      w[c] = _mm256_and_si256(cell, wmask);
+      base = _mm256_add_epi32(base, _mm256_srli_epi32(cell, 15));
+    }
+    if (in.x >= 0) {
+      alignas(32) std::int32_t x[8];
+      _mm256_store_si256(reinterpret_cast<__m256i*>(x), _mm256_shuffle_epi8(px, filler_of));
+      for (int k = 0; k < 8; ++k) b.fill[j + k] = static_cast<std::uint8_t>(x[k]);
+    } else {
+      std::memset(&b.fill[j], 0, 8);
+    }
+    // The simplex: largest weight first, ties to the lower axis (as ops::Sort; with
+    // equal weights either order gives the same sums).
+    const __m256i gt10 = _mm256_cmpgt_epi32(w[1], w[0]), gt20 = _mm256_cmpgt_epi32(w[2], w[0]);
+    const __m256i gt21 = _mm256_cmpgt_epi32(w[2], w[1]);
+    const __m256i first0 = _mm256_andnot_si256(_mm256_or_si256(gt10, gt20), _mm256_set1_epi32(-1));
+    const __m256i first1 = _mm256_andnot_si256(gt21, gt10);
+    const __m256i last0 = _mm256_and_si256(gt10, gt20);
+    const __m256i last1 = _mm256_andnot_si256(gt10, gt21);
+    const __m256i s_first = _mm256_blendv_epi8(_mm256_blendv_epi8(stride[2], stride[1], first1), stride[0], first0);
+    const __m256i s_last = _mm256_blendv_epi8(_mm256_blendv_epi8(stride[2], stride[1], last1), stride[0], last0);
+    const __m256i wmax = _mm256_max_epi32(_mm256_max_epi32(w[0], w[1]), w[2]);
+    const __m256i wmin = _mm256_min_epi32(_mm256_min_epi32(w[0], w[1]), w[2]);
+    const __m256i wsum = _mm256_add_epi32(_mm256_add_epi32(w[0], w[1]), w[2]);
+    const __m256i wmid = _mm256_sub_epi32(wsum, _mm256_add_epi32(wmax, wmin));
+    const __m256i corner[4] = {base, _mm256_add_epi32(base, s_first),
+                               _mm256_sub_epi32(_mm256_add_epi32(base, all), s_last), _mm256_add_epi32(base, all)};
+    // Weight pairs for the multiply-adds: (2^14, largest) and (middle, smallest).
+    const __m256i w1 = _mm256_or_si256(_mm256_slli_epi32(wmax, 16), _mm256_set1_epi32(1 << kWeightBits));
+    const __m256i w2 = _mm256_or_si256(_mm256_slli_epi32(wmin, 16), wmid);
+    __m256i sums[2][2];  // per half: channels 0-1 and 2-3 of its four pixels, axis-major
+    for (int h = 0; h < 2; ++h) {
+      // Whole nodes (four 16-bit lanes) for pixels 4h .. 4h + 3.
+      __m256i n[4];
+      for (int k = 0; k < 4; ++k) {
+        const __m128i idx = h ? _mm256_extracti128_si256(corner[k], 1) : _mm256_castsi256_si128(corner[k]);
+        n[k] = _mm256_i32gather_epi64(nodes64, idx, 8);
+      }
+      const __m256i d1 = _mm256_sub_epi16(n[1], n[0]), d2 = _mm256_sub_epi16(n[2], n[1]);
+      const __m256i d3 = _mm256_sub_epi16(n[3], n[2]);
+      // Even pixels of the half (4h, 4h + 2) sit in the low quadwords, odd ones high.
+      const __m256i even = _mm256_setr_epi32(4 * h, 4 * h, 4 * h, 4 * h, 4 * h + 2, 4 * h + 2, 4 * h + 2, 4 * h + 2);
+      const __m256i odd = _mm256_add_epi32(even, _mm256_set1_epi32(1));
+      const __m256i se = _mm256_add_epi32(
+          _mm256_madd_epi16(_mm256_unpacklo_epi16(n[0], d1), _mm256_permutevar8x32_epi32(w1, even)),
+          _mm256_madd_epi16(_mm256_unpacklo_epi16(d2, d3), _mm256_permutevar8x32_epi32(w2, even)));
+      const __m256i so = _mm256_add_epi32(
+          _mm256_madd_epi16(_mm256_unpackhi_epi16(n[0], d1), _mm256_permutevar8x32_epi32(w1, odd)),
+          _mm256_madd_epi16(_mm256_unpackhi_epi16(d2, d3), _mm256_permutevar8x32_epi32(w2, odd)));
+      // [c0 of p0 p1 p2 p3 | c1 of them] and [c2 | c3].
+      sums[h][0] = _mm256_permute4x64_epi64(_mm256_unpacklo_epi32(se, so), 0xD8);
+      sums[h][1] = _mm256_permute4x64_epi64(_mm256_unpackhi_epi32(se, so), 0xD8);
+    }
+    const __m256i sum[3] = {_mm256_permute2x128_si256(sums[0][0], sums[1][0], 0x20),
+                            _mm256_permute2x128_si256(sums[0][0], sums[1][0], 0x31),
+                            _mm256_permute2x128_si256(sums[0][1], sums[1][1], 0x20)};
+    for (int a = 0; a < 3; ++a) {
+      __m256i v = _mm256_srai_epi32(_mm256_add_epi32(sum[a], round), kWeightBits - 1);
+      v = _mm256_min_epi32(_mm256_max_epi32(v, lo), hi);
+      _mm256_store_si256(reinterpret_cast<__m256i*>(&b.t[a][j]), _mm256_add_epi32(v, mid));
+    }
+  }
+  StagedCurvePositions(p, src, in, m, b, j);
+}
+
+// The cells of StagedCells for eight pixels at once, the curve points gathered.
+__attribute__((target("avx2"))) void StagedCellsAvx2(const FastPath& p, std::size_t m, StagedBlock& b) {
+  const __m256i low8 = _mm256_set1_epi32(255);
+  const __m256i half = _mm256_set1_epi32(128), frac = _mm256_set1_epi32((1 << kClutFracBits) - 1);
+  const __m256i evens_first = _mm256_setr_epi32(0, 2, 4, 6, 1, 3, 5, 7);
+  std::size_t j = 0;
+  for (; j + 8 <= m; j += 8) {
+    __m256i at = _mm256_setzero_si256();
+    for (unsigned a = 0; a < 3; ++a) {
+      const __m256i t = _mm256_load_si256(reinterpret_cast<const __m256i*>(&b.t[a][j]));
+      const __m256i idx = _mm256_srli_epi32(t, 8);
+      // Both points of a curve step in one 64-bit read, then split into c0 and c1.
+      const auto* curve = reinterpret_cast<const long long*>(&p.in_curve[a * 257]);
+      const __m256i p0 = _mm256_permutevar8x32_epi32(
+          _mm256_i32gather_epi64(curve, _mm256_castsi256_si128(idx), 4), evens_first);
+      const __m256i p1 = _mm256_permutevar8x32_epi32(
+          _mm256_i32gather_epi64(curve, _mm256_extracti128_si256(idx, 1), 4), evens_first);
+      const __m256i c0 = _mm256_permute2x128_si256(p0, p1, 0x20);
+      const __m256i c1 = _mm256_permute2x128_si256(p0, p1, 0x31);
+      const __m256i step = _mm256_mullo_epi32(_mm256_sub_epi32(c1, c0), _mm256_and_si256(t, low8));
+      const __m256i pos = _mm256_add_epi32(c0, _mm256_srai_epi32(_mm256_add_epi32(step, half), 8));
+      _mm256_store_si256(reinterpret_cast<__m256i*>(&b.w[a][j]), _mm256_and_si256(pos, frac));
+      at = _mm256_add_epi32(at, _mm256_mullo_epi32(_mm256_srai_epi32(pos, kClutFracBits),
+                                                   _mm256_set1_epi32(p.clut_stride[a])));
+    }
+    _mm256_store_si256(reinterpret_cast<__m256i*>(&b.at[j]), at);
+  }
+  StagedCells(p, m, b, j);
+}
+
+__attribute__((target("avx2"))) void StagedTrilinearAvx2(const FastPath& p, std::size_t m, StagedBlock& b) {
+  const std::int32_t sx = p.clut_stride[0], sy = p.clut_stride[1];
+  std::size_t j = 0;
+  for (; j + 2 <= m; j += 2) {
+    const std::int16_t* q0 = &p.clut[b.at[j]];
+    const std::int16_t* q1 = &p.clut[b.at[j + 1]];
+    const __m256i wx = WeightPairs(b.w[0][j], b.w[0][j + 1]);
+    const __m256i x0 = Lerp16(Load2(q0, q1), Load2(q0 + sx, q1 + sx), wx);
+    const __m256i x1 = Lerp16(Load2(q0 + sy, q1 + sy), Load2(q0 + sx + sy, q1 + sx + sy), wx);
+    const __m256i y = Lerp16(x0, x1, WeightPairs(b.w[1][j], b.w[1][j + 1]));
+    const __m256i z = Lerp16(y, _mm256_srli_si256(y, 8), WeightPairs(b.w[2][j], b.w[2][j + 1]));
+    _mm_storel_epi64(reinterpret_cast<__m128i*>(b.v[j]), _mm256_castsi256_si128(z));
+    _mm_storel_epi64(reinterpret_cast<__m128i*>(b.v[j + 1]), _mm256_extracti128_si256(z, 1));
+  }
+  StagedTrilinearSse2(p, m, b, j);
+}
+
 }  // namespace
 
 void RunSse2(const FastPath& p, const std::uint8_t* src, const PixelLayout& in, std::uint8_t* dst,
@@ -258,6 +546,9 @@ void RunSse2(const FastPath& p, const std::uint8_t* src, const PixelLayout& in, 
 __attribute__((target("avx2"))) void RunAvx2(const FastPath& p, const std::uint8_t* src, const PixelLayout& in,
                                               std::uint8_t* dst, const PixelLayout& out, std::size_t n) {
   std::size_t done = 0;
+  if (p.kind == Kind::Staged) {
+    return StagedRun(p, src, in, dst, out, 0, n, StagedCurvePositionsAvx2, StagedCellsAvx2, StagedTrilinearAvx2);
+  }
   if (p.kind == Kind::Matrix) MatrixAvx2(p, src, in, dst, out, n, done);
   RunPerPixel(p, src, in, dst, out, done, n);
 }

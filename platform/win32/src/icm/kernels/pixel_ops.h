@@ -132,6 +132,64 @@ inline void ShapedClutPixel(const FastPath& p, const std::uint8_t* s, const Pixe
   if (out.x >= 0) d[out.x] = x;
 }
 
+// Staged, stage 1: the position along each of the output table's input curves (0 to
+// 255 steps of 256), read tetrahedrally from the RGB grid and clipped to the curves.
+inline void CurvePositions(const FastPath& p, const std::uint8_t* s, const PixelLayout& in, std::int32_t* t) {
+  std::int32_t base;
+  const Simplex<3> sx = Locate<3>(p, s, in, base);
+  const std::int16_t* c0 = &p.nodes[base];
+  const std::int16_t* c1 = c0 + sx.step[0];
+  const std::int16_t* c2 = c1 + sx.step[1];
+  const std::int16_t* c3 = c2 + sx.step[2];
+  constexpr std::int32_t kMid = 255 * 128;
+  for (unsigned k = 0; k < 3; ++k) {
+    const std::int32_t sum = c0[k] * (1 << kWeightBits) + (c1[k] - c0[k]) * sx.w[0] + (c2[k] - c1[k]) * sx.w[1] +
+                             (c3[k] - c2[k]) * sx.w[2];
+    const std::int32_t v = (sum + (1 << (kWeightBits - 2))) >> (kWeightBits - 1);  // nodes are halved
+    t[k] = (v < -kMid ? -kMid : v > kMid ? kMid : v) + kMid;
+  }
+}
+
+// Staged, stage 2: input curve k at t, as a position in the table's grid: the cell's
+// node offset along the axis and the weight of its upper node.
+inline void ClutAxis(const FastPath& p, unsigned k, std::int32_t t, std::int32_t& offset, std::int32_t& w) {
+  const std::int32_t* c = &p.in_curve[k * 257 + (t >> 8)];
+  const std::int32_t pos = c[0] + (((c[1] - c[0]) * (t & 255) + 128) >> 8);
+  w = pos & ((1 << kClutFracBits) - 1);
+  offset = (pos >> kClutFracBits) * p.clut_stride[k];
+}
+
+inline std::int32_t Lerp(std::int32_t lo, std::int32_t hi, std::int32_t w) {
+  return (lo * (1 << kWeightBits) + (hi - lo) * w + (1 << (kWeightBits - 1))) >> kWeightBits;
+}
+
+// Output curve k at v (output levels with kValueBits of fraction, 0..255 << kValueBits),
+// as a byte, from a table of the curve read linearly between its points.
+inline std::uint8_t OutLevel(const FastPath& p, unsigned k, std::int32_t v) {
+  return p.out_level[k * ((255 << kValueBits) + 1) + v];
+}
+
+inline void StagedPixel(const FastPath& p, const std::uint8_t* s, const PixelLayout& in, std::uint8_t* d,
+                        const PixelLayout& out) {
+  std::int32_t t[3], at[3], w[3];
+  CurvePositions(p, s, in, t);
+  const std::uint8_t x = FillerOf(s, in);
+  for (unsigned a = 0; a < 3; ++a) ClutAxis(p, a, t[a], at[a], w[a]);
+  // Trilinear, as Little CMS reads these tables: along x, then y, then z.
+  const std::int16_t* n = &p.clut[at[0] + at[1] + at[2]];
+  const std::int32_t sx = p.clut_stride[0], sy = p.clut_stride[1], sz = p.clut_stride[2];
+  std::uint8_t o[4];
+  for (unsigned k = 0; k < p.out_channels; ++k) {
+    const std::int16_t* c = n + k;
+    const std::int32_t x00 = Lerp(c[0], c[sx], w[0]), x01 = Lerp(c[sz], c[sx + sz], w[0]);
+    const std::int32_t x10 = Lerp(c[sy], c[sx + sy], w[0]), x11 = Lerp(c[sy + sz], c[sx + sy + sz], w[0]);
+    const std::int32_t v = Lerp(Lerp(x00, x10, w[1]), Lerp(x01, x11, w[1]), w[2]);
+    o[k] = OutLevel(p, k, v);
+  }
+  for (unsigned k = 0; k < p.out_channels; ++k) d[out.at[k]] = o[k];
+  if (out.x >= 0) d[out.x] = x;
+}
+
 inline void Table1Pixel(const FastPath& p, const std::uint8_t* s, const PixelLayout& in, std::uint8_t* d,
                         const PixelLayout& out) {
   const std::uint8_t* t = &p.table[s[in.at[0]] * p.out_channels];
