@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include <limits>
+#include <tuple>
 
 #include "icm/color_codec.h"
 
@@ -11,28 +12,20 @@ namespace {
 using namespace win32::icm;
 
 TEST(ColorCodec, BoundaryValuesAndClipping) {
-  const struct {
-    double (*decode)(WORD);
-    WORD word;
-    double value;
-  } decoded[] = {
+  const std::tuple<double (*)(WORD), WORD, double> decoded[] = {
       {LabLFromWord, 0x0000, 0.0},     {LabLFromWord, 0xFF00, 100.0},  {LabLFromWord, 0xFFFF, 100.0 + 255 / 652.8},
       {LabABFromWord, 0x8000, 0.0},    {LabABFromWord, 0x0000, -128},  {LabABFromWord, 0xFF00, 127.0},
       {LabABFromWord, 0xFEFF, 127.0 - 1 / 256.0}, {LabABFromWord, 0xFFFF, 127.0 + 255 / 256.0},
       {UnitFromWord, 0x0000, 0.0},     {UnitFromWord, 0xFFFF, 1.0},
   };
-  for (const auto& d : decoded) EXPECT_NEAR(d.decode(d.word), d.value, 1e-12) << std::hex << d.word;
+  for (const auto& [decode, word, value] : decoded) EXPECT_NEAR(decode(word), value, 1e-12) << std::hex << word;
   const double nan = std::numeric_limits<double>::quiet_NaN();
-  const struct {
-    WORD (*encode)(double);
-    double value;
-    WORD word;
-  } encoded[] = {
+  const std::tuple<WORD (*)(double), double, WORD> encoded[] = {
       {LabLToWord, -3.0, 0},         {LabLToWord, 101.0, 0xFFFF},    {LabLToWord, 50.0, 0x7F80},
       {LabABToWord, -200.0, 0},      {LabABToWord, 128.5, 0xFFFF},   {LabABToWord, -0.001, 0x8000},
       {UnitToWord, -0.25, 0},        {UnitToWord, 1.3, 0xFFFF},      {UnitToWord, nan, 0},
   };
-  for (const auto& e : encoded) EXPECT_EQ(e.encode(e.value), e.word) << e.value;
+  for (const auto& [encode, value, word] : encoded) EXPECT_EQ(encode(value), word) << value;
   EXPECT_EQ(UnitToByte(0.5), 128);
   EXPECT_EQ(UnitToByte(2.0), 255);
   EXPECT_EQ(UnitToByte(nan), 0);

@@ -12,6 +12,7 @@
 #include <fstream>
 #include <iterator>
 #include <string>
+#include <tuple>
 #include <vector>
 
 #include "icm.h"
@@ -112,6 +113,13 @@ inline HPROFILE OpenMemory(const Bytes& bytes, DWORD access = PROFILE_READWRITE)
 inline HPROFILE OpenPath(const std::string& windowsPath, DWORD access, DWORD creation) {
   PROFILE p{PROFILE_FILENAME, const_cast<char*>(windowsPath.c_str()), static_cast<DWORD>(windowsPath.size())};
   return OpenColorProfileA(&p, access, FILE_SHARE_READ, creation);
+}
+
+// IsColorProfileValid's result, flag and last error all agree with the expectation.
+inline void ExpectValid(HPROFILE h, BOOL valid) {
+  BOOL flag = 7;
+  EXPECT_WIN32(IsColorProfileValid(h, &flag), valid, valid ? ERROR_SUCCESS : ERROR_INVALID_PROFILE);
+  EXPECT_EQ(flag, valid);
 }
 
 // The tag signatures of an open profile, in table order.

@@ -1,5 +1,5 @@
-// Conformance of the element calls: reads at every boundary, writes, size changes,
-// shared data, and the tag-table queries.
+// The element calls: reads at every boundary, writes, size changes, shared data, and the
+// tag-table queries.
 #include <algorithm>
 #include <cstring>
 #include <tuple>
@@ -14,6 +14,7 @@ using namespace icctest;
 // Table end is 132 + 3 * 12 = 168. wtpt holds file bytes 168..187; rTRC and gTRC share
 // 188..201. MakeProfile fills byte i of the file with i & 0xFF.
 const Bytes kSample = MakeProfile({{Sig("wtpt"), 168, 20}, {Sig("rTRC"), 188, 14}, {Sig("gTRC"), 188, 14}}, 36);
+const std::vector<TAGTYPE> kSampleTags = {Sig("wtpt"), Sig("rTRC"), Sig("gTRC")};
 // count file bytes from the given one, then zeros up to size.
 Bytes FileBytes(std::uint32_t from, std::uint32_t count, std::uint32_t size = 0) {
   Bytes b(std::max(count, size), 0);
@@ -43,16 +44,9 @@ BOOL Write(HPROFILE h, TAGTYPE tag, DWORD offset, Bytes data) {
 TEST(GetColorProfileElement, Boundaries) {
   HPROFILE h = OpenMemory(kSample, PROFILE_READ);
   constexpr DWORD kUntouched = 0xCAFE;
-  struct Case {
-    const char* what;
-    TAGTYPE tag;
-    DWORD offset, pcb;
-    bool withBuffer;
-    BOOL result;
-    DWORD error, pcbAfter;
-    std::uint32_t firstFileByte;  // where the copied bytes come from
-    BOOL reference;
-  } cases[] = {
+  // what, tag, offset, *pcbElement, with a buffer, result, error, *pcbElement after, the file
+  // byte the copied bytes start at, *pbReference after
+  const std::tuple<const char*, TAGTYPE, DWORD, DWORD, bool, BOOL, DWORD, DWORD, std::uint32_t, BOOL> cases[] = {
       {"size query", Sig("wtpt"), 0, 0, false, FALSE, ERROR_INSUFFICIENT_BUFFER, 20, 0, kUntouched},
       {"size query ignores offset", Sig("wtpt"), 7, 3, false, FALSE, ERROR_INSUFFICIENT_BUFFER, 20, 0, kUntouched},
       {"exact", Sig("wtpt"), 0, 20, true, TRUE, ERROR_SUCCESS, 20, 168, FALSE},
@@ -67,18 +61,16 @@ TEST(GetColorProfileElement, Boundaries) {
       {"shared data", Sig("gTRC"), 0, 64, true, TRUE, ERROR_SUCCESS, 14, 188, TRUE},
       {"shared data, other entry", Sig("rTRC"), 2, 5, true, TRUE, ERROR_SUCCESS, 5, 190, TRUE},
   };
-  for (const Case& c : cases) {
-    SCOPED_TRACE(c.what);
+  for (auto [what, tag, offset, pcb, withBuffer, result, error, pcbAfter, firstFileByte, referenceAfter] : cases) {
+    SCOPED_TRACE(what);
     std::uint8_t buffer[64];
     std::memset(buffer, 0xEE, sizeof buffer);
-    DWORD pcb = c.pcb;
     BOOL reference = kUntouched;
-    EXPECT_WIN32(GetColorProfileElement(h, c.tag, c.offset, &pcb, c.withBuffer ? buffer : nullptr, &reference),
-                 c.result, c.error);
-    EXPECT_EQ(pcb, c.pcbAfter);
-    EXPECT_EQ(reference, c.reference);
-    const std::size_t copied = c.result ? c.pcbAfter : 0;
-    EXPECT_EQ(Bytes(buffer, buffer + copied), FileBytes(c.firstFileByte, static_cast<std::uint32_t>(copied)));
+    EXPECT_WIN32(GetColorProfileElement(h, tag, offset, &pcb, withBuffer ? buffer : nullptr, &reference), result, error);
+    EXPECT_EQ(pcb, pcbAfter);
+    EXPECT_EQ(reference, referenceAfter);
+    const std::size_t copied = result ? pcbAfter : 0;
+    EXPECT_EQ(Bytes(buffer, buffer + copied), FileBytes(firstFileByte, static_cast<std::uint32_t>(copied)));
     for (std::size_t i = copied; i < sizeof buffer; ++i) ASSERT_EQ(buffer[i], 0xEE) << "wrote past " << copied;
   }
   DWORD pcb = 8;
@@ -97,7 +89,7 @@ TEST(ColorProfileTags, IndexAndPresence) {
     EXPECT_WIN32(GetColorProfileElementTag(h, bad, &tag), FALSE, ERROR_INVALID_PARAMETER);
     EXPECT_EQ(tag, 0x1234u) << "left untouched";
   }
-  EXPECT_EQ(TagList(h), (std::vector<TAGTYPE>{Sig("wtpt"), Sig("rTRC"), Sig("gTRC")}));
+  EXPECT_EQ(TagList(h), kSampleTags);
   for (auto [tag, present] : {std::pair{Sig("wtpt"), TRUE}, {Sig("gTRC"), TRUE}, {Sig("cprt"), FALSE}, {0u, FALSE}}) {
     BOOL answer = 7;
     EXPECT_WIN32(IsColorProfileTagPresent(h, tag, &answer), TRUE, ERROR_SUCCESS);
@@ -142,7 +134,7 @@ TEST(ElementWrites, ReadOnlyHandlesRefuseEveryChange) {
     for (DWORD size : {0u, 8u, 40u}) EXPECT_WIN32(SetColorProfileElementSize(h, tag, size), FALSE, ERROR_ACCESS_DENIED);
   EXPECT_WIN32(SetColorProfileElementReference(h, Sig("bTRC"), Sig("rTRC")), FALSE, ERROR_ACCESS_DENIED);
   EXPECT_EQ(Element(h, Sig("wtpt")), FileBytes(168, 20));
-  EXPECT_EQ(TagList(h), (std::vector<TAGTYPE>{Sig("wtpt"), Sig("rTRC"), Sig("gTRC")}));
+  EXPECT_EQ(TagList(h), kSampleTags);
   EXPECT_TRUE(CloseColorProfile(h));
 }
 
@@ -222,7 +214,7 @@ TEST(SetColorProfileElementReference, ParameterChecksThenSharing) {
   };
   for (auto [handle, newTag, refTag, error] : refused)
     EXPECT_WIN32(SetColorProfileElementReference(handle, newTag, refTag), FALSE, error);
-  EXPECT_EQ(TagList(h), (std::vector<TAGTYPE>{Sig("wtpt"), Sig("rTRC"), Sig("gTRC")})) << "nothing added";
+  EXPECT_EQ(TagList(h), kSampleTags) << "nothing added";
 
   EXPECT_WIN32(SetColorProfileElementReference(h, Sig("bXYZ"), Sig("wtpt")), TRUE, ERROR_SUCCESS);
   EXPECT_EQ(TagList(h), (std::vector<TAGTYPE>{Sig("wtpt"), Sig("rTRC"), Sig("gTRC"), Sig("bXYZ")}));

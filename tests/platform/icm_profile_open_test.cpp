@@ -1,8 +1,10 @@
-// Conformance of OpenColorProfileA, CloseColorProfile, the header calls and
-// SerializeProfile: parameter checks first, then behaviour, with the exact last error.
+// OpenColorProfileA, CloseColorProfile, the header calls and SerializeProfile: parameter
+// checks first, then behaviour, with the exact last error.
 #include <sys/stat.h>
 
+#include <algorithm>
 #include <cstring>
+#include <filesystem>
 #include <functional>
 
 #include "handle_table.h"
@@ -13,7 +15,7 @@ namespace {
 
 using namespace icctest;
 
-TEST(OpenColorProfileA, RefusesBadArguments) {
+TEST(OpenColorProfileA, RefusesBadArgumentsAndReadsARealProfileInFileOrder) {
   const Bytes srgb = ReadBytes(IccPath("sRGB.icc"));
   const std::string path = win32::WindowsPathFromPosix(IccPath("sRGB.icc"));
   char* name = const_cast<char*>(path.c_str());
@@ -21,39 +23,31 @@ TEST(OpenColorProfileA, RefusesBadArguments) {
   const DWORD size = static_cast<DWORD>(srgb.size());
   struct {
     const char* what;
-    bool nullProfile;
     PROFILE profile;
     DWORD access, creation, error;
   } cases[] = {
-      {"null PROFILE", true, {}, PROFILE_READ, OPEN_EXISTING, ERROR_INVALID_PARAMETER},
-      {"null data", false, {PROFILE_FILENAME, nullptr, 0}, PROFILE_READ, OPEN_EXISTING, ERROR_INVALID_PARAMETER},
-      {"type 0", false, {0, name, 0}, PROFILE_READ, OPEN_EXISTING, ERROR_INVALID_PARAMETER},
-      {"type 3", false, {3, mem, size}, PROFILE_READ, OPEN_EXISTING, ERROR_INVALID_PARAMETER},
-      {"access 0", false, {PROFILE_FILENAME, name, 0}, 0, OPEN_EXISTING, ERROR_INVALID_PARAMETER},
-      {"access 3", false, {PROFILE_MEMBUFFER, mem, size}, 3, OPEN_EXISTING, ERROR_INVALID_PARAMETER},
-      {"creation 0", false, {PROFILE_FILENAME, name, 0}, PROFILE_READ, 0, ERROR_INVALID_PARAMETER},
-      {"creation 6", false, {PROFILE_FILENAME, name, 0}, PROFILE_READ, 6, ERROR_INVALID_PARAMETER},
-      {"drive C:", false, {PROFILE_FILENAME, const_cast<char*>("C:\\x.icc"), 0}, PROFILE_READ, OPEN_EXISTING,
+      {"null data", {PROFILE_FILENAME, nullptr, 0}, PROFILE_READ, OPEN_EXISTING, ERROR_INVALID_PARAMETER},
+      {"type 0", {0, name, 0}, PROFILE_READ, OPEN_EXISTING, ERROR_INVALID_PARAMETER},
+      {"type 3", {3, mem, size}, PROFILE_READ, OPEN_EXISTING, ERROR_INVALID_PARAMETER},
+      {"access 0", {PROFILE_FILENAME, name, 0}, 0, OPEN_EXISTING, ERROR_INVALID_PARAMETER},
+      {"access 3", {PROFILE_MEMBUFFER, mem, size}, 3, OPEN_EXISTING, ERROR_INVALID_PARAMETER},
+      {"creation 0", {PROFILE_FILENAME, name, 0}, PROFILE_READ, 0, ERROR_INVALID_PARAMETER},
+      {"creation 6", {PROFILE_FILENAME, name, 0}, PROFILE_READ, 6, ERROR_INVALID_PARAMETER},
+      {"drive C:", {PROFILE_FILENAME, const_cast<char*>("C:\\x.icc"), 0}, PROFILE_READ, OPEN_EXISTING,
        ERROR_PATH_NOT_FOUND},
-      {"memory too short", false, {PROFILE_MEMBUFFER, mem, 131}, PROFILE_READ, OPEN_EXISTING,
-       ERROR_INVALID_PROFILE},
+      {"memory too short", {PROFILE_MEMBUFFER, mem, 131}, PROFILE_READ, OPEN_EXISTING, ERROR_INVALID_PROFILE},
   };
   for (auto& c : cases) {
     SCOPED_TRACE(c.what);
-    EXPECT_WIN32(OpenColorProfileA(c.nullProfile ? nullptr : &c.profile, c.access, 0, c.creation), nullptr, c.error);
+    EXPECT_WIN32(OpenColorProfileA(&c.profile, c.access, 0, c.creation), nullptr, c.error);
   }
-}
+  EXPECT_WIN32(OpenColorProfileA(nullptr, PROFILE_READ, 0, OPEN_EXISTING), nullptr, ERROR_INVALID_PARAMETER);
 
-TEST(OpenColorProfileA, ReadsARealProfileInFileOrder) {
-  const Bytes raw = ReadBytes(IccPath("sRGB.icc"));
-  const std::vector<TagEntry> table = TagTable(raw);
   SetLastError(kSentinel);
-  HPROFILE h = OpenPath(win32::WindowsPathFromPosix(IccPath("sRGB.icc")), PROFILE_READ, OPEN_EXISTING);
+  HPROFILE h = OpenPath(path, PROFILE_READ, OPEN_EXISTING);
   EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
-  DWORD count = 0;
-  EXPECT_WIN32(GetCountColorProfileElements(h, &count), TRUE, ERROR_SUCCESS);
   std::vector<TAGTYPE> expected;
-  for (const TagEntry& e : table) expected.push_back(e.signature);
+  for (const TagEntry& e : TagTable(srgb)) expected.push_back(e.signature);
   EXPECT_EQ(TagList(h), expected);
   EXPECT_WIN32(CloseColorProfile(h), TRUE, ERROR_SUCCESS);
 }
@@ -77,16 +71,15 @@ TEST(ProfileCalls, RefuseHandlesThatAreNotOpenProfiles) {
         {"GetCountColorProfileElements", [&] { return GetCountColorProfileElements(bad, &count); }},
         {"GetColorProfileElementTag", [&] { return GetColorProfileElementTag(bad, 1, &tag); }},
         {"IsColorProfileTagPresent", [&] { return IsColorProfileTagPresent(bad, Sig("desc"), &flag); }},
-        {"GetColorProfileElement",
-         [&] { return GetColorProfileElement(bad, Sig("desc"), 0, &count, buffer, &flag); }},
+        {"GetColorProfileElement", [&] { return GetColorProfileElement(bad, Sig("desc"), 0, &count, buffer, &flag); }},
         {"SetColorProfileElement", [&] { return SetColorProfileElement(bad, Sig("desc"), 0, &count, buffer); }},
         {"SetColorProfileElementSize", [&] { return SetColorProfileElementSize(bad, Sig("desc"), 8); }},
         {"SerializeProfile", [&] { return win32::icm::SerializeProfile(bad, bytes); }},
         {"CloseColorProfile", [&] { return CloseColorProfile(bad); }},
     };
-    for (const auto& call : calls) {
-      SCOPED_TRACE(call.first);
-      EXPECT_WIN32(call.second(), FALSE, ERROR_INVALID_HANDLE);
+    for (const auto& [what, call] : calls) {
+      SCOPED_TRACE(what);
+      EXPECT_WIN32(call(), FALSE, ERROR_INVALID_HANDLE);
     }
   }
   // The transform handle survived the attempts.
@@ -97,12 +90,8 @@ using OpenModes = TempFolderTest;
 
 TEST_F(OpenModes, CreationModesOnExistingAndMissingFiles) {
   const Bytes srgb = ReadBytes(IccPath("sRGB.icc"));
-  const struct {
-    DWORD creation;
-    bool exists;
-    DWORD error;  // 0: opens
-    bool blank;   // opens as a blank profile
-  } cases[] = {
+  // creation, whether the file exists, the last error (0: opens), whether it opens blank
+  const std::tuple<DWORD, bool, DWORD, bool> cases[] = {
       {OPEN_EXISTING, true, 0, false},    {OPEN_EXISTING, false, ERROR_FILE_NOT_FOUND, false},
       {OPEN_ALWAYS, true, 0, false},      {OPEN_ALWAYS, false, 0, true},
       {CREATE_NEW, true, ERROR_FILE_EXISTS, false}, {CREATE_NEW, false, 0, true},
@@ -110,89 +99,86 @@ TEST_F(OpenModes, CreationModesOnExistingAndMissingFiles) {
       {TRUNCATE_EXISTING, true, 0, true}, {TRUNCATE_EXISTING, false, ERROR_FILE_NOT_FOUND, false},
   };
   int n = 0;
-  for (const auto& c : cases) {
-    SCOPED_TRACE(testing::Message() << "creation " << c.creation << (c.exists ? " existing" : " missing"));
+  for (const auto& [creation, exists, error, blank] : cases) {
+    SCOPED_TRACE(testing::Message() << "creation " << creation << (exists ? " existing" : " missing"));
     const std::string name = "p" + std::to_string(n++) + ".icc";
-    if (c.exists) WriteBytes(Posix(name), srgb);
+    if (exists) WriteBytes(Posix(name), srgb);
     SetLastError(kSentinel);
-    HPROFILE h = OpenPath(Win(name), PROFILE_READWRITE, c.creation);
-    EXPECT_EQ(GetLastError(), c.error);
-    if (c.error != 0) {
+    HPROFILE h = OpenPath(Win(name), PROFILE_READWRITE, creation);
+    EXPECT_EQ(GetLastError(), error);
+    if (error != 0) {
       EXPECT_EQ(h, nullptr);
       continue;
     }
-    DWORD count = 99;
-    ASSERT_TRUE(GetCountColorProfileElements(h, &count));
-    EXPECT_EQ(count, c.blank ? 0u : TagTable(srgb).size());
+    EXPECT_EQ(TagList(h).size(), blank ? 0u : TagTable(srgb).size());
     ASSERT_TRUE(CloseColorProfile(h));
     const Bytes after = ReadBytes(Posix(name));
-    if (c.blank) {  // written at close: header with 'acsp', no tags, the size field matching
-      ASSERT_EQ(after.size(), 132u);
-      EXPECT_EQ(BE32(after, 0), 132u);
-      EXPECT_EQ(BE32(after, 36), Sig("acsp"));
-      EXPECT_EQ(BE32(after, 128), 0u);
-    } else {
+    if (!blank) {
       EXPECT_EQ(after, srgb);
+      continue;
     }
+    // written at close: header with 'acsp', no tags, the size field matching
+    ASSERT_EQ(after.size(), 132u);
+    EXPECT_EQ(BE32(after, 0), 132u);
+    EXPECT_EQ(BE32(after, 36), Sig("acsp"));
+    EXPECT_EQ(BE32(after, 128), 0u);
   }
   // A read-only blank profile is never written.
-  HPROFILE h = OpenPath(Win("ro.icc"), PROFILE_READ, CREATE_ALWAYS);
-  ASSERT_TRUE(CloseColorProfile(h));
-  struct stat st;
-  EXPECT_NE(stat(Posix("ro.icc").c_str(), &st), 0);
+  ASSERT_TRUE(CloseColorProfile(OpenPath(Win("ro.icc"), PROFILE_READ, CREATE_ALWAYS)));
+  EXPECT_FALSE(std::filesystem::exists(Posix("ro.icc")));
 }
 
-TEST_F(OpenModes, PathErrorsAndBareNames) {
+TEST_F(OpenModes, PathErrorsSpecialFilesAndBareNames) {
   ASSERT_EQ(mkdir(colorDir_.c_str(), 0777), 0);
-  const struct {
-    std::string path;
-    DWORD access, creation, error;
-  } cases[] = {
+  ASSERT_EQ(mkfifo(Posix("pipe").c_str(), 0666), 0);
+  const std::tuple<std::string, DWORD, DWORD, DWORD> cases[] = {
       {Win("no/such/folder.icc"), PROFILE_READ, OPEN_EXISTING, ERROR_PATH_NOT_FOUND},
       {Win("no/such/folder.icc"), PROFILE_READWRITE, CREATE_ALWAYS, ERROR_PATH_NOT_FOUND},
       {Win(""), PROFILE_READ, OPEN_EXISTING, ERROR_ACCESS_DENIED},  // a folder
       {Win(std::string(MAX_PATH, 'n')), PROFILE_READ, OPEN_EXISTING, ERROR_FILENAME_EXCED_RANGE},
       {"missing.icm", PROFILE_READ, OPEN_EXISTING, ERROR_FILE_NOT_FOUND},
+      {"Z:\\tw-missing.icm", PROFILE_READ, OPEN_EXISTING, ERROR_FILE_NOT_FOUND},  // in the root folder
+      {Win("pipe"), PROFILE_READ, OPEN_EXISTING, ERROR_ACCESS_DENIED},  // special files are not profiles
+      {"Z:\\dev\\zero", PROFILE_READ, OPEN_EXISTING, ERROR_ACCESS_DENIED},
   };
-  for (const auto& c : cases) EXPECT_WIN32(OpenPath(c.path, c.access, c.creation), nullptr, c.error);
-  // A bare name is looked up in the colour directory.
+  for (const auto& [path, access, creation, error] : cases) EXPECT_WIN32(OpenPath(path, access, creation), nullptr, error);
+  // A bare name is looked up in the colour directory; a rooted path without a drive is on Z:.
   WriteBytes(colorDir_ + "/Bare Name.icm", ReadBytes(IccPath("Gray.icc")));
-  SetLastError(kSentinel);
-  HPROFILE h = OpenPath("Bare Name.icm", PROFILE_READ, OPEN_EXISTING);
-  EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
-  PROFILEHEADER header;
-  ASSERT_TRUE(GetColorProfileHeader(h, &header));
-  EXPECT_EQ(header.phDataColorSpace, static_cast<DWORD>(SPACE_GRAY));
-  EXPECT_TRUE(CloseColorProfile(h));
+  std::string rooted = colorDir_ + "/Bare Name.icm";
+  std::replace(rooted.begin(), rooted.end(), '/', '\\');
+  for (const std::string& name : {std::string("Bare Name.icm"), rooted}) {
+    SetLastError(kSentinel);
+    HPROFILE h = OpenPath(name, PROFILE_READ, OPEN_EXISTING);
+    EXPECT_EQ(GetLastError(), ERROR_SUCCESS);
+    PROFILEHEADER header;
+    ASSERT_TRUE(GetColorProfileHeader(h, &header));
+    EXPECT_EQ(header.phDataColorSpace, static_cast<DWORD>(SPACE_GRAY));
+    EXPECT_TRUE(CloseColorProfile(h));
+  }
 }
 
-TEST(ColorProfileHeader, ComesOutInHostOrder) {
+TEST(ColorProfileHeader, ComesOutInHostOrderAndIsStoredAsGiven) {
   const Bytes raw = ReadBytes(IccPath("sRGB.icc"));
-  HPROFILE h = OpenMemory(raw, PROFILE_READ);
-  EXPECT_WIN32(GetColorProfileHeader(h, nullptr), FALSE, ERROR_INVALID_PARAMETER);
-  PROFILEHEADER header;
-  EXPECT_WIN32(GetColorProfileHeader(h, &header), TRUE, ERROR_SUCCESS);
-  EXPECT_EQ(header.phSize, raw.size());
-  EXPECT_EQ(header.phClass, static_cast<DWORD>(CLASS_MONITOR));
-  EXPECT_EQ(header.phDataColorSpace, static_cast<DWORD>(SPACE_RGB));
-  EXPECT_EQ(header.phConnectionSpace, static_cast<DWORD>(SPACE_XYZ));
-  EXPECT_EQ(header.phSignature, 0x61637370u);
-  EXPECT_EQ(header.phIlluminant.ciexyzX, 0x0000F6D6);
-  EXPECT_EQ(header.phIlluminant.ciexyzY, 0x00010000);
-  EXPECT_EQ(header.phIlluminant.ciexyzZ, 0x0000D32D);
-  // The file's date is 2004-08-13 12:18:06, six big-endian 16-bit fields read as words.
-  EXPECT_EQ(header.phDateTime[0], (2004u << 16) | 8u);
-  EXPECT_EQ(header.phDateTime[1], (13u << 16) | 12u);
-  EXPECT_EQ(header.phDateTime[2], (18u << 16) | 6u);
-  EXPECT_WIN32(SetColorProfileHeader(h, &header), FALSE, ERROR_ACCESS_DENIED);
-  EXPECT_TRUE(CloseColorProfile(h));
-}
-
-TEST(ColorProfileHeader, SetStoresTheBytesAsGiven) {
-  HPROFILE h = OpenMemory(ReadBytes(IccPath("sRGB.icc")));
-  EXPECT_WIN32(SetColorProfileHeader(h, nullptr), FALSE, ERROR_INVALID_PARAMETER);
+  HPROFILE ro = OpenMemory(raw, PROFILE_READ), h = OpenMemory(raw);
+  EXPECT_WIN32(GetColorProfileHeader(ro, nullptr), FALSE, ERROR_INVALID_PARAMETER);
   PROFILEHEADER in;
-  ASSERT_TRUE(GetColorProfileHeader(h, &in));
+  EXPECT_WIN32(GetColorProfileHeader(ro, &in), TRUE, ERROR_SUCCESS);
+  EXPECT_EQ(in.phSize, raw.size());
+  EXPECT_EQ(in.phClass, static_cast<DWORD>(CLASS_MONITOR));
+  EXPECT_EQ(in.phDataColorSpace, static_cast<DWORD>(SPACE_RGB));
+  EXPECT_EQ(in.phConnectionSpace, static_cast<DWORD>(SPACE_XYZ));
+  EXPECT_EQ(in.phSignature, 0x61637370u);
+  EXPECT_EQ(in.phIlluminant.ciexyzX, 0x0000F6D6);
+  EXPECT_EQ(in.phIlluminant.ciexyzY, 0x00010000);
+  EXPECT_EQ(in.phIlluminant.ciexyzZ, 0x0000D32D);
+  // The file's date is 2004-08-13 12:18:06, six big-endian 16-bit fields read as words.
+  EXPECT_EQ(in.phDateTime[0], (2004u << 16) | 8u);
+  EXPECT_EQ(in.phDateTime[1], (13u << 16) | 12u);
+  EXPECT_EQ(in.phDateTime[2], (18u << 16) | 6u);
+  EXPECT_WIN32(SetColorProfileHeader(ro, &in), FALSE, ERROR_ACCESS_DENIED);
+  EXPECT_TRUE(CloseColorProfile(ro));
+
+  EXPECT_WIN32(SetColorProfileHeader(h, nullptr), FALSE, ERROR_INVALID_PARAMETER);
   in.phSize = 12345;
   in.phClass = CLASS_PRINTER;
   in.phDateTime[0] = (2026u << 16) | 12;

@@ -74,19 +74,15 @@ TEST(LastError, IsPerThread) {
 }
 
 TEST(GlobalAlloc, RefusesMoveableUnknownFlagsAndAbsurdSizes) {
-  const struct {
-    UINT flags;
-    SIZE_T bytes;
-    DWORD error;
-  } cases[] = {
+  const std::tuple<UINT, SIZE_T, DWORD> cases[] = {
       {GMEM_MOVEABLE, 16, ERROR_NOT_SUPPORTED},    {GMEM_MOVEABLE | GMEM_ZEROINIT, 16, ERROR_NOT_SUPPORTED},
       {0x8000, 16, ERROR_INVALID_PARAMETER},       {GMEM_MODIFY, 16, ERROR_INVALID_PARAMETER},
       {GPTR, ~SIZE_T{0}, ERROR_NOT_ENOUGH_MEMORY}, {GMEM_FIXED, ~SIZE_T{0} / 2, ERROR_NOT_ENOUGH_MEMORY},
   };
-  for (const auto& c : cases) EXPECT_WIN32(GlobalAlloc(c.flags, c.bytes), nullptr, c.error);
+  for (const auto& [flags, bytes, error] : cases) EXPECT_WIN32(GlobalAlloc(flags, bytes), nullptr, error);
 }
 
-TEST(GlobalAlloc, GivesAlignedWritableBlocksZeroedOnRequest) {
+TEST(GlobalAlloc, GivesAlignedWritableBlocksZeroedOnRequestAndFreesOnlyLiveOnes) {
   for (UINT flags : {UINT{GMEM_FIXED}, UINT{GPTR}, UINT{GMEM_FIXED | GMEM_NODISCARD | GMEM_SHARE}}) {
     for (SIZE_T bytes : {SIZE_T{0}, SIZE_T{13}, SIZE_T{4096}}) {
       SetLastError(kSentinel);
@@ -97,15 +93,11 @@ TEST(GlobalAlloc, GivesAlignedWritableBlocksZeroedOnRequest) {
       for (SIZE_T i = 0; (flags & GMEM_ZEROINIT) && i < bytes; ++i) ASSERT_EQ(p[i], 0) << i;
       std::memset(p, 0xA5, bytes);
       EXPECT_WIN32(GlobalFree(p), nullptr, ERROR_SUCCESS);
+      EXPECT_WIN32(GlobalFree(p), p, ERROR_INVALID_HANDLE);  // freed: no longer a live block
     }
   }
-}
-
-TEST(GlobalFree, ReturnsTheHandleWhenItIsNotALiveBlock) {
-  void* p = GlobalAlloc(GPTR, 32);
-  ASSERT_EQ(GlobalFree(p), nullptr);
   int on_stack = 0;
-  for (void* bad : {p, static_cast<void*>(&on_stack)}) EXPECT_WIN32(GlobalFree(bad), bad, ERROR_INVALID_HANDLE);
+  EXPECT_WIN32(GlobalFree(&on_stack), &on_stack, ERROR_INVALID_HANDLE);
   EXPECT_WIN32(GlobalFree(nullptr), nullptr, ERROR_SUCCESS);
 }
 

@@ -1,7 +1,8 @@
-// Conformance of CreateMultiProfileTransform, DeleteColorTransform and TranslateColors.
-// Colours are compared with Little CMS called directly in double precision.
+// CreateMultiProfileTransform, DeleteColorTransform, TranslateColors and CreateDeviceLinkProfile,
+// against Little CMS called directly in double precision.
 #include <gtest/gtest.h>
 
+#include <map>
 #include <memory>
 #include <random>
 #include <vector>
@@ -12,22 +13,7 @@ namespace {
 
 using namespace transform_test;
 
-class TransformTest : public ::testing::Test {
- protected:
-  void SetUp() override {
-    for (const Profile* p : {&srgb_, &adobe_, &cmyk_, &lab_, &xyz_, &gray_, &abstract_, &named_}) {
-      ASSERT_NE(p->get(), nullptr);
-    }
-  }
-  Profile srgb_{"sRGB.icc"};
-  Profile adobe_{"compatibleWithAdobeRGB1998.icc"};
-  Profile cmyk_{"ghostscript/default_cmyk.icc"};
-  Profile lab_{"LCMSLABI.ICM"};
-  Profile xyz_{"LCMSXYZI.ICM"};
-  Profile gray_{"Gray.icc"};
-  Profile abstract_{"CineLogCurve.icc"};
-  Profile named_{"colord/x11-colors.icc"};
-};
+using TransformTest = ChainTest;
 
 TEST_F(TransformTest, CreateRefusesBadArgumentsAndHandles) {
   HPROFILE two[2] = {srgb_.get(), adobe_.get()};
@@ -41,12 +27,7 @@ TEST_F(TransformTest, CreateRefusesBadArgumentsAndHandles) {
   }
   HPROFILE with_closed[2] = {srgb_.get(), closed}, with_transform[2] = {srgb_.get(), other.get()};
   HPROFILE with_null[2] = {nullptr, srgb_.get()};
-  const struct {
-    PHPROFILE profiles;
-    DWORD count;
-    PDWORD intents;
-    DWORD intent_count, error;
-  } cases[] = {
+  const std::tuple<PHPROFILE, DWORD, PDWORD, DWORD, DWORD> cases[] = {  // profiles, count, intents, count, error
       {nullptr, 2, intents, 1, ERROR_INVALID_PARAMETER},      {two, 0, intents, 1, ERROR_INVALID_PARAMETER},
       {eleven, 11, intents, 11, ERROR_INVALID_PARAMETER},     {two, 0xFFFFFFFF, intents, 1, ERROR_INVALID_PARAMETER},
       {two, 2, nullptr, 1, ERROR_INVALID_PARAMETER},          {two, 2, intents, 0, ERROR_INVALID_PARAMETER},
@@ -54,23 +35,13 @@ TEST_F(TransformTest, CreateRefusesBadArgumentsAndHandles) {
       {with_closed, 2, intents, 1, ERROR_INVALID_HANDLE},     {with_transform, 2, intents, 1, ERROR_INVALID_HANDLE},
       {with_null, 2, intents, 1, ERROR_INVALID_HANDLE},
   };
-  for (size_t i = 0; i < std::size(cases); ++i) {
-    SCOPED_TRACE(i);
-    SetLastError(kSentinel);
-    EXPECT_EQ(CreateMultiProfileTransform(cases[i].profiles, cases[i].count, cases[i].intents,
-                                          cases[i].intent_count, 0, 0),
-              nullptr);
-    EXPECT_EQ(GetLastError(), cases[i].error);
-  }
+  for (const auto& [profiles, count, ints, int_count, error] : cases)
+    EXPECT_WIN32(CreateMultiProfileTransform(profiles, count, ints, int_count, 0, 0), nullptr, error);
 }
 
 TEST_F(TransformTest, CreateChecksThatTheChainLinks) {
   const HPROFILE s = srgb_.get(), a = adobe_.get(), c = cmyk_.get();
-  const struct {
-    const char* what;
-    std::vector<HPROFILE> profiles;
-    DWORD error;
-  } cases[] = {
+  const std::tuple<const char*, std::vector<HPROFILE>, DWORD> cases[] = {
       {"RGB input after CMYK output", {s, c, a}, ERROR_COLORSPACE_MISMATCH},
       {"RGB input after gray output", {s, gray_.get(), a}, ERROR_COLORSPACE_MISMATCH},
       {"named colours not first", {s, named_.get()}, ERROR_COLORSPACE_MISMATCH},
@@ -81,50 +52,39 @@ TEST_F(TransformTest, CreateChecksThatTheChainLinks) {
       {"named first", {named_.get(), s}, ERROR_SUCCESS},
       {"ten profiles", {s, a, s, a, s, a, s, a, s, a}, ERROR_SUCCESS},
   };
-  for (const auto& k : cases) {
-    SCOPED_TRACE(k.what);
+  for (const auto& [what, profiles, error] : cases) {
+    SCOPED_TRACE(what);
     SetLastError(kSentinel);
-    Xform x(k.profiles, std::vector<DWORD>(k.profiles.size(), kRel));
-    EXPECT_EQ(x.get() != nullptr, k.error == ERROR_SUCCESS);
-    EXPECT_EQ(GetLastError(), k.error);
+    Xform x(profiles, std::vector<DWORD>(profiles.size(), kRel));
+    EXPECT_EQ(x.get() != nullptr, error == ERROR_SUCCESS);
+    EXPECT_EQ(GetLastError(), error);
   }
 }
 
 // Class, data space and connection space must be signatures the engine knows before
 // the chain uses them; values with the top bit set are outside its enumerations.
 TEST_F(TransformTest, CreateRefusesUnknownHeaderSignatures) {
-  const icctest::Bytes srgb = icctest::ReadBytes(IccPath("sRGB.icc"));
-  const struct {
-    size_t at;
-    std::uint32_t value;
-    DWORD error;
-  } cases[] = {
-      {12, 0x80000000u | icctest::Sig("mntr"), ERROR_INVALID_PROFILE},
-      {16, 0x80000000u | icctest::Sig("RGB "), ERROR_INVALID_PROFILE},
-      {20, 0x80000000u | icctest::Sig("XYZ "), ERROR_INVALID_PROFILE},
-      {16, 0xFFFFFFFFu, ERROR_INVALID_PROFILE},
-      {12, icctest::Sig("ABCD"), ERROR_INVALID_PROFILE},
-      {16, icctest::Sig("ABCD"), ERROR_INVALID_PROFILE},
-      {20, icctest::Sig("ABCD"), ERROR_INVALID_PROFILE},
-      {12, icctest::Sig("scnr"), ERROR_SUCCESS},  // known values pass
-      {16, icctest::Sig("RGB "), ERROR_SUCCESS},
+  using icctest::Sig;
+  const std::pair<size_t, std::uint32_t> cases[] = {  // where, what; the last two are known and pass
+      {12, 0x80000000u | Sig("mntr")}, {16, 0x80000000u | Sig("RGB ")}, {20, 0x80000000u | Sig("XYZ ")},
+      {16, 0xFFFFFFFFu}, {12, Sig("ABCD")}, {16, Sig("ABCD")}, {20, Sig("ABCD")}, {12, Sig("scnr")}, {16, Sig("RGB ")},
   };
-  for (const auto& c : cases) {
-    icctest::Bytes bytes = srgb;
-    icctest::PutBE32(bytes, c.at, c.value);
+  for (const auto& [at, value] : cases) {
+    const DWORD error = value == Sig("scnr") || value == Sig("RGB ") ? ERROR_SUCCESS : ERROR_INVALID_PROFILE;
+    icctest::Bytes bytes = icctest::ReadBytes(IccPath("sRGB.icc"));
+    icctest::PutBE32(bytes, at, value);
     Profile odd(bytes);
     ASSERT_NE(odd.get(), nullptr);
     for (bool first : {true, false}) {
-      SCOPED_TRACE(testing::Message() << c.at << " " << std::hex << c.value << (first ? " first" : " second"));
-      const HPROFILE pair[2] = {first ? odd.get() : adobe_.get(), first ? adobe_.get() : odd.get()};
+      SCOPED_TRACE(testing::Message() << at << " " << std::hex << value << (first ? " first" : " second"));
+      HPROFILE pair[2] = {first ? odd.get() : adobe_.get(), first ? adobe_.get() : odd.get()};
       SetLastError(kSentinel);
       Xform x({pair[0], pair[1]}, {kRel, kRel});
-      EXPECT_EQ(x.get() != nullptr, c.error == ERROR_SUCCESS);
-      EXPECT_EQ(GetLastError(), c.error);
+      EXPECT_EQ(x.get() != nullptr, error == ERROR_SUCCESS);
+      EXPECT_EQ(GetLastError(), error);
       BYTE* link = nullptr;
       DWORD intents[2] = {kRel, kRel};
-      EXPECT_WIN32(CreateDeviceLinkProfile(const_cast<PHPROFILE>(pair), 2, intents, 2, 0, &link, 0),
-                   c.error == ERROR_SUCCESS, c.error);
+      EXPECT_WIN32(CreateDeviceLinkProfile(pair, 2, intents, 2, 0, &link, 0), error == ERROR_SUCCESS, error);
       GlobalFree(link);
     }
   }
@@ -159,14 +119,7 @@ TEST_F(TransformTest, CallsRefuseHandlesThatAreNotLiveTransforms) {
 TEST_F(TransformTest, TranslateRefusesBadArguments) {
   Xform x({srgb_.get(), adobe_.get()}, {kRel});
   COLOR in[2] = {}, out[2] = {};
-  const struct {
-    PCOLOR in;
-    DWORD count;
-    COLORTYPE in_type;
-    PCOLOR out;
-    COLORTYPE out_type;
-    DWORD error;
-  } cases[] = {
+  const std::tuple<PCOLOR, DWORD, COLORTYPE, PCOLOR, COLORTYPE, DWORD> cases[] = {
       {nullptr, 0, COLOR_RGB, nullptr, COLOR_RGB, ERROR_SUCCESS},  // nothing to do
       {nullptr, 1, COLOR_RGB, out, COLOR_RGB, ERROR_INVALID_PARAMETER},
       {in, 1, COLOR_RGB, nullptr, COLOR_RGB, ERROR_INVALID_PARAMETER},
@@ -180,23 +133,11 @@ TEST_F(TransformTest, TranslateRefusesBadArguments) {
       {in, 1, COLOR_5_CHANNEL, out, COLOR_RGB, ERROR_COLORSPACE_MISMATCH},
       {in, 2, COLOR_3_CHANNEL, out, COLOR_3_CHANNEL, ERROR_SUCCESS},
   };
-  for (size_t i = 0; i < std::size(cases); ++i) {
-    SCOPED_TRACE(i);
-    const auto& c = cases[i];
-    EXPECT_WIN32(TranslateColors(x.get(), c.in, c.count, c.in_type, c.out, c.out_type), c.error == ERROR_SUCCESS, c.error);
-  }
+  for (const auto& [in, count, in_type, out, out_type, error] : cases)
+    EXPECT_WIN32(TranslateColors(x.get(), in, count, in_type, out, out_type), error == ERROR_SUCCESS, error);
 }
 
-TEST_F(TransformTest, IdentityAndWhite) {
-  Xform identity({srgb_.get(), srgb_.get()}, {kRel, kRel});
-  for (WORD w : {WORD{0}, WORD{0x0101}, WORD{0x8000}, WORD{0xFFFF}}) {
-    COLOR c{};
-    c.rgb = {w, 0xFFFF, 0x8000};
-    ASSERT_TRUE(TranslateColors(identity.get(), &c, 1, COLOR_RGB, &c, COLOR_RGB));  // in place
-    EXPECT_NEAR(c.rgb.red, w, 1);  // double precision: within one word
-    EXPECT_NEAR(c.rgb.green, 0xFFFF, 1);
-    EXPECT_NEAR(c.rgb.blue, 0x8000, 1);
-  }
+TEST_F(TransformTest, WhiteInEachConnectionSpaceEncoding) {
   Xform to_lab({srgb_.get(), lab_.get()}, {kRel, kRel});
   Xform to_xyz({srgb_.get(), xyz_.get()}, {kRel, kRel});
   COLOR white{}, lab{}, xyz{}, yxy[2]{};
@@ -341,6 +282,77 @@ TEST_F(TransformTest, IntentsApplyPerProfile) {
   COLOR out{};
   ASSERT_TRUE(TranslateColors(one.get(), colors.data(), 1, COLOR_RGB, &out, COLOR_CMYK));
   for (int i = 0; i < 4; ++i) EXPECT_NEAR((&out.cmyk.cyan)[i], Word(ink[i] / 100), 1) << i;
+}
+
+using CreateDeviceLinkProfile = ChainTest;
+using icctest::Bytes;
+using icctest::Sig;
+
+// Calls CreateDeviceLinkProfile with success expected and returns the link's bytes, after
+// checking its header: a link from in to out, whole as Little CMS reads it.
+Bytes Link(std::vector<HPROFILE> chain, std::vector<DWORD> intents, const char (&in)[5], const char (&out)[5]) {
+  BYTE* data = nullptr;
+  EXPECT_WIN32(::CreateDeviceLinkProfile(chain.data(), static_cast<DWORD>(chain.size()), intents.data(),
+                                       static_cast<DWORD>(intents.size()), BEST_MODE, &data, INDEX_DONT_CARE),
+               TRUE, ERROR_SUCCESS);
+  if (!data) return {};
+  Bytes icc(data, data + (data[0] << 24 | data[1] << 16 | data[2] << 8 | data[3]));
+  EXPECT_WIN32(GlobalFree(data), nullptr, ERROR_SUCCESS);
+  EXPECT_EQ(icctest::BE32(icc, 12), Sig("link"));
+  EXPECT_EQ(icctest::BE32(icc, 16), Sig(in));
+  EXPECT_EQ(icctest::BE32(icc, 20), Sig(out));
+  cmsHPROFILE opened = cmsOpenProfileFromMem(icc.data(), static_cast<cmsUInt32Number>(icc.size()));
+  EXPECT_NE(opened, nullptr);
+  if (opened) cmsCloseProfile(opened);
+  return icc;
+}
+
+TEST_F(CreateDeviceLinkProfile, RefusesBadArguments) {
+  HPROFILE chain[2] = {srgb_.get(), adobe_.get()}, bad[2] = {srgb_.get(), reinterpret_cast<HPROFILE>(0x4444)};
+  HPROFILE named_first[2] = {named_.get(), srgb_.get()}, mismatch[3] = {srgb_.get(), cmyk_.get(), adobe_.get()};
+  DWORD intents[1] = {0};
+  BYTE* data = reinterpret_cast<BYTE*>(0x1);
+  const std::tuple<PHPROFILE, DWORD, PBYTE*, DWORD> cases[] = {
+      {chain, 2, nullptr, ERROR_INVALID_PARAMETER},       {nullptr, 2, &data, ERROR_INVALID_PARAMETER},
+      {chain, 0, &data, ERROR_INVALID_PARAMETER},         {bad, 2, &data, ERROR_INVALID_HANDLE},
+      {named_first, 2, &data, ERROR_INVALID_PROFILE},     {mismatch, 3, &data, ERROR_COLORSPACE_MISMATCH},
+  };
+  for (const auto& [profiles, count, out, error] : cases) {
+    EXPECT_WIN32(::CreateDeviceLinkProfile(profiles, count, intents, 1, 0, out, 0), FALSE, error);
+    if (out) {
+      EXPECT_EQ(data, nullptr);
+    }
+  }
+}
+
+// A chain may begin or end in the PCS: the link then has Lab or XYZ as that end's space.
+TEST_F(CreateDeviceLinkProfile, LinksFromAndToTheConnectionSpaces) {
+  Link({srgb_.get(), lab_.get()}, {INTENT_PERCEPTUAL}, "RGB ", "Lab ");
+  Link({lab_.get(), srgb_.get()}, {INTENT_PERCEPTUAL}, "Lab ", "RGB ");
+  Link({xyz_.get(), srgb_.get()}, {INTENT_PERCEPTUAL}, "XYZ ", "RGB ");
+  Link({srgb_.get(), xyz_.get()}, {INTENT_PERCEPTUAL}, "RGB ", "XYZ ");
+}
+
+TEST_F(CreateDeviceLinkProfile, IsAVersion2LinkThatConvertsLikeTheChain) {
+  const Bytes icc = Link({srgb_.get(), cmyk_.get()}, {INTENT_PERCEPTUAL, kRel}, "RGB ", "CMYK");
+  ASSERT_GE(icc.size(), 132u);
+  EXPECT_EQ(icc[8], 0x02);  // major version
+  std::map<std::uint32_t, std::uint32_t> types;  // tag -> its type
+  for (const icctest::TagEntry& t : icctest::TagTable(icc)) types[t.signature] = icctest::BE32(icc, t.offset);
+  EXPECT_EQ(types[Sig("A2B0")], Sig("mft2"));
+  EXPECT_EQ(types[Sig("pseq")], Sig("pseq"));
+  // The link alone against the chain. Its 33-point grid resamples the chain: allow 2 % of
+  // the range per ink.
+  Profile link(icc);
+  Xform through_link({link.get()}, {INTENT_PERCEPTUAL});
+  Xform through_chain({srgb_.get(), cmyk_.get()}, {INTENT_PERCEPTUAL, kRel});
+  std::vector<COLOR> in(64), a(64), b(64);
+  for (size_t i = 0; i < in.size(); ++i)
+    in[i].rgb = {static_cast<WORD>((i & 3) * 0x5555), static_cast<WORD>((i >> 2 & 3) * 0x5555),
+                 static_cast<WORD>((i >> 4) * 0x5555)};
+  ASSERT_TRUE(TranslateColors(through_link.get(), in.data(), 64, COLOR_RGB, a.data(), COLOR_CMYK));
+  ASSERT_TRUE(TranslateColors(through_chain.get(), in.data(), 64, COLOR_RGB, b.data(), COLOR_CMYK));
+  for (size_t i = 0; i < in.size() * 4; ++i) EXPECT_NEAR((&a[i / 4].cmyk.cyan)[i % 4], (&b[i / 4].cmyk.cyan)[i % 4], 1311);
 }
 
 }  // namespace

@@ -48,6 +48,14 @@ class Xform {
   HTRANSFORM handle_;
 };
 
+// The profiles most chains are made of, open through the stand-in.
+class ChainTest : public ::testing::Test {
+ protected:
+  Profile srgb_{"sRGB.icc"}, adobe_{"compatibleWithAdobeRGB1998.icc"}, cmyk_{"ghostscript/default_cmyk.icc"},
+      lab_{"LCMSLABI.ICM"}, xyz_{"LCMSXYZI.ICM"}, gray_{"Gray.icc"}, abstract_{"CineLogCurve.icc"},
+      named_{"colord/x11-colors.icc"};
+};
+
 // Little CMS on its own, for independent expectations.
 class LcmsChain {
  public:
