@@ -241,19 +241,19 @@ bool ReverseOutputCurves(cmsHPROFILE dst, unsigned oc, Curves& out) {
 }
 
 // Linear values are kept times this scale, which puts sqrt(linear) on the output
-// tables' index with 8 bits of fraction: sqrt(x * S) = sqrt(x) * kShaperSteps * 256.
-constexpr double kLinearScale = double{kShaperSteps} * 256.0 * kShaperSteps * 256.0;
+// tables' index: sqrt(x * S) = sqrt(x) * kShaperSize.
+constexpr double kLinearScale = double{kShaperSize} * kShaperSize;
 
 // The output tables: the reversed curves over u = sqrt(linear), fine near black where
 // output curves are steepest.
 void FillShaper(const Curves& out_curves, unsigned oc, FastPath& fp) {
   fp.limit = static_cast<float>(kLinearScale);
-  fp.shaper.resize(oc * (kShaperSteps + 2));
+  fp.shaper.assign(oc * (kShaperSize + 1) + 3, 0);  // the padding lets a gather read four bytes
   for (unsigned k = 0; k < oc; ++k) {
-    for (unsigned i = 0; i < kShaperSteps + 2; ++i) {
-      const double u = std::min(i, kShaperSteps) / static_cast<double>(kShaperSteps);
+    for (unsigned i = 0; i <= kShaperSize; ++i) {
+      const double u = std::min(i + 0.5, double{kShaperSize}) / kShaperSize;
       const double y = cmsEvalToneCurveFloat(out_curves.c[k], static_cast<cmsFloat32Number>(u * u));
-      fp.shaper[k * (kShaperSteps + 2) + i] = static_cast<std::uint16_t>(Fixed(y));
+      fp.shaper[k * (kShaperSize + 1) + i] = static_cast<std::uint8_t>(std::lround(std::clamp(y, 0.0, 1.0) * 255));
     }
   }
 }

@@ -56,8 +56,11 @@ struct PixelLayout {
 enum class Kind { Table1, Matrix, Clut3, Clut4, ShapedClut3, ShapedClut4, Staged };
 enum class Isa { Scalar, Sse2, Avx2 };
 
-// Output tables of the matrix-shaper path: entries over u = sqrt(linear) in [0, 1].
-constexpr unsigned kShaperSteps = 4096;
+// Output tables of the matrix-shaper and linear-light paths: the output byte for each
+// of kShaperSize steps of u = sqrt(linear) in [0, 1], taken at the step's middle, and
+// one for u = 1. Steps in the square root are fine near black, where output curves are
+// steepest, and small enough everywhere that reading the table needs no interpolation.
+constexpr unsigned kShaperSize = 1u << 14;
 // Grid points per axis of the sampled chains.
 constexpr unsigned kGrid3 = 52;
 constexpr unsigned kGrid4 = 17;
@@ -85,7 +88,7 @@ struct FastPath {
   // (and the clamp of the scaled linear value) serve the ShapedClut kinds too.
   std::vector<float> lin;         // 3 * 256 * 4
   float limit = 0;
-  std::vector<std::uint16_t> shaper;  // out_channels * (kShaperSteps + 2)
+  std::vector<std::uint8_t> shaper;  // out_channels * (kShaperSize + 1), then 3 bytes of padding
 
   // Clut3 / Clut4: nodes of out_channels signed 16-bit values (padded at the end so
   // any node can be read as 8 bytes), and per input level its node offset on each

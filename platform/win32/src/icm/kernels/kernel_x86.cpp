@@ -1,6 +1,7 @@
 // The x86 kernels: SSE2 (every x86-64 has it) works a pixel at a time with the
 // pixel's channels side by side in one register; AVX2, chosen at run time, converts
-// matrix-shaper runs eight pixels at a time with gathers, and does the staged path's
+// matrix-shaper runs two pixels to a register (gathers are slower than loads of each
+// pixel's matrix columns on some processors), and does the staged path's
 // table reads eight pixels at a time and its trilinear step two at a time. Linear-light
 // and staged pixels go in blocks, so that the cache misses of a block overlap. Every
 // kernel ends a run with the per-pixel steps the scalar kernel uses.
@@ -25,11 +26,7 @@ inline void PutBytes(std::uint32_t o, std::uint8_t x, const PixelLayout& out, st
   if (out.x >= 0) d[out.x] = x;
 }
 
-inline std::uint8_t ShapeQ(const FastPath& p, unsigned k, std::uint32_t q) {
-  const std::uint16_t* t = &p.shaper[k * (kShaperSteps + 2) + (q >> 8)];
-  const std::uint32_t f = q & 255;
-  return static_cast<std::uint8_t>((t[0] * (256 - f) + t[1] * f + (1u << (kValueBits + 7))) >> (kValueBits + 8));
-}
+inline std::uint8_t ShapeQ(const FastPath& p, unsigned k, std::uint32_t q) { return p.shaper[k * (kShaperSize + 1) + q]; }
 
 inline void MatrixPixelSse2(const FastPath& p, const std::uint8_t* s, const PixelLayout& in, std::uint8_t* d,
                             const PixelLayout& out, __m128 limit) {
@@ -44,6 +41,37 @@ inline void MatrixPixelSse2(const FastPath& p, const std::uint8_t* s, const Pixe
   std::uint32_t o = 0;
   for (unsigned k = 0; k < p.out_channels; ++k) o |= std::uint32_t{ShapeQ(p, k, q[k])} << (8 * k);
   PutBytes(o, x, out, d, p.out_channels);
+}
+
+// Matrix-shaper runs into three channels. The tables and byte offsets are held in
+// locals: every byte written could otherwise alias them and force them to be read again.
+inline void MatrixRgbSse2(const FastPath& p, const std::uint8_t* src, const PixelLayout& in, std::uint8_t* dst,
+                          const PixelLayout& out, std::size_t from, std::size_t n) {
+  const float* lin = p.lin.data();
+  const std::uint8_t* t0 = p.shaper.data();
+  const std::uint8_t* t1 = t0 + (kShaperSize + 1);
+  const std::uint8_t* t2 = t1 + (kShaperSize + 1);
+  const unsigned ib = in.bytes, ob = out.bytes, i0 = in.at[0], i1 = in.at[1], i2 = in.at[2];
+  const unsigned o0 = out.at[0], o1 = out.at[1], o2 = out.at[2];
+  const int ix = in.x, ox = out.x;
+  const __m128 limit = _mm_set1_ps(p.limit), zero = _mm_setzero_ps();
+  for (std::size_t i = from; i < n; ++i) {
+    const std::uint8_t* s = src + i * ib;
+    std::uint8_t* d = dst + i * ob;
+    const std::uint8_t x = ix >= 0 ? s[ix] : 0;
+    const __m128 a = _mm_loadu_ps(lin + s[i0] * 4);
+    const __m128 b = _mm_loadu_ps(lin + (256 + s[i1]) * 4);
+    const __m128 c = _mm_loadu_ps(lin + (512 + s[i2]) * 4);
+    const __m128 v = _mm_min_ps(_mm_max_ps(_mm_add_ps(_mm_add_ps(a, b), c), zero), limit);
+    const __m128i q = _mm_cvttps_epi32(_mm_sqrt_ps(v));
+    const std::uint8_t r = t0[_mm_cvtsi128_si32(q)];
+    const std::uint8_t g = t1[_mm_cvtsi128_si32(_mm_srli_si128(q, 4))];
+    const std::uint8_t bl = t2[_mm_cvtsi128_si32(_mm_srli_si128(q, 8))];
+    d[o0] = r;
+    d[o1] = g;
+    d[o2] = bl;
+    if (ox >= 0) d[ox] = x;
+  }
 }
 
 template <unsigned N>
@@ -281,6 +309,7 @@ inline void RunPerPixel(const FastPath& p, const std::uint8_t* src, const PixelL
       return Each(src, in, dst, out, from, n,
                   [&](const std::uint8_t* s, std::uint8_t* d) { ops::Table1Pixel(p, s, in, d, out); });
     case Kind::Matrix: {
+      if (p.out_channels == 3) return MatrixRgbSse2(p, src, in, dst, out, from, n);
       const __m128 limit = _mm_set1_ps(p.limit);
       return Each(src, in, dst, out, from, n,
                   [&](const std::uint8_t* s, std::uint8_t* d) { MatrixPixelSse2(p, s, in, d, out, limit); });
@@ -305,67 +334,36 @@ inline void RunPerPixel(const FastPath& p, const std::uint8_t* src, const PixelL
   }
 }
 
-// The byte shuffle that turns eight dwords (channel k in byte k, the filler in byte 3)
-// into the output layout, four pixels per 128-bit half.
-__attribute__((target("avx2"))) __m256i OutputShuffle(const PixelLayout& out, unsigned channels) {
-  alignas(16) std::int8_t m[16];
-  std::memset(m, -128, sizeof m);  // zero the bytes past the packed pixels
-  for (unsigned px = 0; px < 4; ++px) {
-    for (unsigned k = 0; k < channels; ++k) m[px * out.bytes + out.at[k]] = static_cast<std::int8_t>(px * 4 + k);
-    if (out.x >= 0) m[px * out.bytes + out.x] = static_cast<std::int8_t>(px * 4 + 3);
-  }
-  const __m128i h = _mm_load_si128(reinterpret_cast<const __m128i*>(m));
-  return _mm256_broadcastsi128_si256(h);
-}
-
-__attribute__((target("avx2"))) void MatrixAvx2(const FastPath& p, const std::uint8_t* src, const PixelLayout& in,
-                                                 std::uint8_t* dst, const PixelLayout& out, std::size_t n,
-                                                 std::size_t& done) {
-  const unsigned oc = p.out_channels;
-  const __m256i lanes = _mm256_mullo_epi32(_mm256_setr_epi32(0, 1, 2, 3, 4, 5, 6, 7), _mm256_set1_epi32(in.bytes));
-  __m256i at[3];
-  for (int c = 0; c < 3; ++c) at[c] = _mm256_add_epi32(lanes, _mm256_set1_epi32(in.at[c]));
-  const __m256i at_x = _mm256_add_epi32(lanes, _mm256_set1_epi32(in.x >= 0 ? in.x : 0));
-  const __m256i byte = _mm256_set1_epi32(0xFF);
-  const __m256 zero = _mm256_setzero_ps(), limit = _mm256_set1_ps(p.limit);
-  const __m256i low8 = _mm256_set1_epi32(0xFF), half = _mm256_set1_epi32(1 << (kValueBits + 7));
-  const __m256i one = _mm256_set1_epi32(256);
-  const __m256i shuffle = OutputShuffle(out, oc);
+// MatrixRgbSse2 two pixels at a time: both are read before either is written (in
+// place needs it), and their six channels share one square root and conversion.
+__attribute__((target("avx2"))) void MatrixRgbAvx2(const FastPath& p, const std::uint8_t* src,
+                                                    const PixelLayout& in, std::uint8_t* dst, const PixelLayout& out,
+                                                    std::size_t n, std::size_t& done) {
   const float* lin = p.lin.data();
-  const int* shaper = reinterpret_cast<const int*>(p.shaper.data());
-  // A gather reads four bytes from each channel's offset: stop while whole pixels
-  // remain past the last one read, so no read leaves the run.
+  const std::uint8_t* t0 = p.shaper.data();
+  const std::uint8_t* t1 = t0 + (kShaperSize + 1);
+  const std::uint8_t* t2 = t1 + (kShaperSize + 1);
+  const unsigned ib = in.bytes, ob = out.bytes, i0 = in.at[0], i1 = in.at[1], i2 = in.at[2];
+  const unsigned o0 = out.at[0], o1 = out.at[1], o2 = out.at[2];
+  const int ix = in.x, ox = out.x;
+  const __m256 limit = _mm256_set1_ps(p.limit), zero = _mm256_setzero_ps();
+  const auto sum = [&](const std::uint8_t* s) {
+    return _mm_add_ps(_mm_add_ps(_mm_loadu_ps(lin + s[i0] * 4), _mm_loadu_ps(lin + (256 + s[i1]) * 4)),
+                      _mm_loadu_ps(lin + (512 + s[i2]) * 4));
+  };
   std::size_t i = 0;
-  for (; i + 9 <= n; i += 8) {
-    const int* s = reinterpret_cast<const int*>(src + i * in.bytes);
-    __m256i v[3];
-    for (int c = 0; c < 3; ++c) {
-      v[c] = _mm256_slli_epi32(_mm256_and_si256(_mm256_i32gather_epi32(s, at[c], 1), byte), 2);
-    }
-    const __m256i x = in.x >= 0 ? _mm256_and_si256(_mm256_i32gather_epi32(s, at_x, 1), byte) : _mm256_setzero_si256();
-    __m256i packed = _mm256_slli_epi32(x, 24);
-    for (unsigned k = 0; k < oc; ++k) {
-      const __m256 a = _mm256_i32gather_ps(lin + k, v[0], 4);
-      const __m256 b = _mm256_i32gather_ps(lin + 256 * 4 + k, v[1], 4);
-      const __m256 c = _mm256_i32gather_ps(lin + 512 * 4 + k, v[2], 4);
-      __m256 sum = _mm256_add_ps(_mm256_add_ps(a, b), c);
-      sum = _mm256_min_ps(_mm256_max_ps(sum, zero), limit);
-      const __m256i q = _mm256_cvttps_epi32(_mm256_sqrt_ps(sum));
-      const __m256i f = _mm256_and_si256(q, low8);
-      // Entries i and i + 1 in one dword, weighted (256 - f, f) by a pairwise multiply.
-      const __m256i t = _mm256_i32gather_epi32(shaper + 0, _mm256_add_epi32(_mm256_srli_epi32(q, 8),
-                                                                            _mm256_set1_epi32(k * (kShaperSteps + 2))),
-                                               2);
-      const __m256i w = _mm256_or_si256(_mm256_sub_epi32(one, f), _mm256_slli_epi32(f, 16));
-      const __m256i o = _mm256_srli_epi32(_mm256_add_epi32(_mm256_madd_epi16(t, w), half), kValueBits + 8);
-      packed = _mm256_or_si256(packed, _mm256_slli_epi32(o, 8 * k));
-    }
-    const __m256i bytes = _mm256_shuffle_epi8(packed, shuffle);
-    std::uint8_t* d = dst + i * out.bytes;
-    const unsigned half_bytes = 4 * out.bytes;
-    std::memcpy(d, &bytes, half_bytes);
-    const __m128i hi = _mm256_extracti128_si256(bytes, 1);
-    std::memcpy(d + half_bytes, &hi, half_bytes);
+  for (; i + 2 <= n; i += 2) {
+    const std::uint8_t* s = src + i * ib;
+    std::uint8_t* d = dst + i * ob;
+    const std::uint8_t x0 = ix >= 0 ? s[ix] : 0, x1 = ix >= 0 ? s[ib + ix] : 0;
+    __m256 v = _mm256_insertf128_ps(_mm256_castps128_ps256(sum(s)), sum(s + ib), 1);
+    v = _mm256_min_ps(_mm256_max_ps(v, zero), limit);
+    alignas(32) std::int32_t q[8];
+    _mm256_store_si256(reinterpret_cast<__m256i*>(q), _mm256_cvttps_epi32(_mm256_sqrt_ps(v)));
+    const std::uint8_t r0 = t0[q[0]], g0 = t1[q[1]], b0 = t2[q[2]], r1 = t0[q[4]], g1 = t1[q[5]], b1 = t2[q[6]];
+    d[o0] = r0, d[o1] = g0, d[o2] = b0;
+    d[ob + o0] = r1, d[ob + o1] = g1, d[ob + o2] = b1;
+    if (ox >= 0) d[ox] = x0, d[ob + ox] = x1;
   }
   done = i;
 }
@@ -549,7 +547,7 @@ __attribute__((target("avx2"))) void RunAvx2(const FastPath& p, const std::uint8
   if (p.kind == Kind::Staged) {
     return StagedRun(p, src, in, dst, out, 0, n, StagedCurvePositionsAvx2, StagedCellsAvx2, StagedTrilinearAvx2);
   }
-  if (p.kind == Kind::Matrix) MatrixAvx2(p, src, in, dst, out, n, done);
+  if (p.kind == Kind::Matrix && p.out_channels == 3) MatrixRgbAvx2(p, src, in, dst, out, n, done);
   RunPerPixel(p, src, in, dst, out, done, n);
 }
 

@@ -14,10 +14,7 @@ inline std::uint8_t FillerOf(const std::uint8_t* s, const PixelLayout& in) { ret
 
 // Output table k read at the scaled linear value v (already clamped to 0..limit).
 inline std::uint8_t Shape(const FastPath& p, unsigned k, float v) {
-  const auto q = static_cast<std::uint32_t>(static_cast<std::int32_t>(std::sqrt(v)));
-  const std::uint16_t* t = &p.shaper[k * (kShaperSteps + 2) + (q >> 8)];
-  const std::uint32_t f = q & 255;
-  return static_cast<std::uint8_t>((t[0] * (256 - f) + t[1] * f + (1u << (kValueBits + 7))) >> (kValueBits + 8));
+  return p.shaper[k * (kShaperSize + 1) + static_cast<std::uint32_t>(static_cast<std::int32_t>(std::sqrt(v)))];
 }
 
 inline void MatrixPixel(const FastPath& p, const std::uint8_t* s, const PixelLayout& in, std::uint8_t* d,
