@@ -310,7 +310,7 @@ bool BuildShapedClut(const Chain& chain, cmsHTRANSFORM exact, FastPath& fp) {
   }
 
   fp.kind = n == 3 ? Kind::ShapedClut3 : Kind::ShapedClut4;
-  fp.linear_nodes.assign(count * oc + 4, 0.0f);  // room to read the last node as four lanes
+  fp.linear_nodes.assign(count * oc + 8, 0.0f);  // room to read the last node as eight lanes
   for (size_t i = 0; i < count * oc; ++i) {
     // Far outside the gamut the value only needs to stay outside it.
     fp.linear_nodes[i] = static_cast<float>(std::clamp(lin[i], -4.0, 4.0) * kLinearScale);

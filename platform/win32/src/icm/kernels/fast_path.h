@@ -93,7 +93,7 @@ struct FastPath {
   // Clut3 / Clut4: nodes of out_channels signed 16-bit values (padded at the end so
   // any node can be read as 8 bytes), and per input level its node offset on each
   // axis and its weight within the cell. ShapedClut3 / ShapedClut4 keep their nodes
-  // as scaled linear values in linear_nodes (padded so any node reads as 16 bytes)
+  // as scaled linear values in linear_nodes (padded so any node reads as 32 bytes)
   // and end through `limit` and `shaper`.
   unsigned grid = 0;
   std::vector<std::int16_t> nodes;

@@ -139,10 +139,10 @@ inline ShapedCell LocateShaped(const FastPath& p, const std::uint8_t* s, const P
   return cell;
 }
 
-// The scalar ShapedClutPixel with the channels side by side.
+// The scalar ShapedClutPixel with the channels side by side, up to the output
+// tables' indices.
 template <unsigned N>
-inline void ShapedPixelSse2(const FastPath& p, const ShapedCell& cell, std::uint8_t* d, const PixelLayout& out,
-                            __m128 limit) {
+inline __m128i ShapedIndicesSse2(const ShapedCell& cell, __m128 limit) {
   const ops::Simplex<3>& sx = cell.sx;
   const __m128 w[3] = {_mm_set1_ps(sx.w[0] * ops::kUnitWeight), _mm_set1_ps(sx.w[1] * ops::kUnitWeight),
                        _mm_set1_ps(sx.w[2] * ops::kUnitWeight)};
@@ -151,35 +151,97 @@ inline void ShapedPixelSse2(const FastPath& p, const ShapedCell& cell, std::uint
     v = _mm_add_ps(v, _mm_mul_ps(_mm_sub_ps(TetraSse2(cell.c + cell.k_step, sx, w), v), _mm_set1_ps(cell.k_weight)));
   }
   v = _mm_min_ps(_mm_max_ps(v, _mm_setzero_ps()), limit);
-  alignas(16) std::uint32_t q[4];
-  _mm_store_si128(reinterpret_cast<__m128i*>(q), _mm_cvttps_epi32(_mm_sqrt_ps(v)));
-  std::uint32_t o = 0;
-  for (unsigned k = 0; k < p.out_channels; ++k) o |= std::uint32_t{ShapeQ(p, k, q[k])} << (8 * k);
-  PutBytes(o, cell.x, out, d, p.out_channels);
+  return _mm_cvttps_epi32(_mm_sqrt_ps(v));
 }
 
 // Linear-light tables run to megabytes, so most pixels miss the cache: a block of
-// pixels is located first, with the corners of each cell fetched ahead, and then
-// interpolated, so that the misses of the block overlap. Every pixel of a block is
-// read before any is written, as in-place conversion needs.
+// pixels is located first, with the corners of each cell fetched ahead, then
+// interpolated, then written, so that the misses of the block overlap and no byte
+// written can alias the tables being read. Every pixel of a block is read before any
+// is written, as in-place conversion needs.
+constexpr std::size_t kShapedBlock = 32;
+
+struct ShapedBlock {
+  ShapedCell cells[kShapedBlock];
+  alignas(16) std::int32_t at[kShapedBlock][4];  // output table indices
+};
+
+template <unsigned N>
+inline void LocateBlock(const FastPath& p, const std::uint8_t* src, const PixelLayout& in, std::size_t m,
+                        ShapedBlock& b) {
+  for (std::size_t j = 0; j < m; ++j) {
+    const ShapedCell& cell = b.cells[j] = LocateShaped<N>(p, src + j * in.bytes, in);
+    const float* corner = cell.c;
+    for (unsigned t = 0; t < 4; ++t) {
+      _mm_prefetch(reinterpret_cast<const char*>(corner), _MM_HINT_T0);
+      if constexpr (N == 4) _mm_prefetch(reinterpret_cast<const char*>(corner + cell.k_step + 3), _MM_HINT_T0);
+      if (t < 3) corner += cell.sx.step[t];
+    }
+  }
+}
+
+inline void WriteBlock(const FastPath& p, const PixelLayout& out, std::uint8_t* d, std::size_t m,
+                       const ShapedBlock& b) {
+  const std::uint8_t* table = p.shaper.data();
+  const unsigned oc = p.out_channels;
+  for (std::size_t j = 0; j < m; ++j, d += out.bytes) {
+    for (unsigned k = 0; k < oc; ++k) d[out.at[k]] = table[b.at[j][k]];
+    if (out.x >= 0) d[out.x] = b.cells[j].x;
+  }
+}
+
+const __m128i kTableAt = _mm_setr_epi32(0, kShaperSize + 1, 2 * (kShaperSize + 1), 0);
+
 template <unsigned N>
 void ShapedBlocksSse2(const FastPath& p, const std::uint8_t* src, const PixelLayout& in, std::uint8_t* dst,
                       const PixelLayout& out, std::size_t n) {
-  constexpr std::size_t kBlock = 32;
   const __m128 limit = _mm_set1_ps(p.limit);
-  ShapedCell cells[kBlock];
-  for (std::size_t i = 0; i < n; i += kBlock) {
-    const std::size_t m = n - i < kBlock ? n - i : kBlock;
+  ShapedBlock b;
+  for (std::size_t i = 0; i < n; i += kShapedBlock) {
+    const std::size_t m = n - i < kShapedBlock ? n - i : kShapedBlock;
+    LocateBlock<N>(p, src + i * in.bytes, in, m, b);
     for (std::size_t j = 0; j < m; ++j) {
-      const ShapedCell& cell = cells[j] = LocateShaped<N>(p, src + (i + j) * in.bytes, in);
-      const float* corner = cell.c;
-      for (unsigned t = 0; t < 4; ++t) {
-        _mm_prefetch(reinterpret_cast<const char*>(corner), _MM_HINT_T0);
-        if constexpr (N == 4) _mm_prefetch(reinterpret_cast<const char*>(corner + cell.k_step + 3), _MM_HINT_T0);
-        if (t < 3) corner += cell.sx.step[t];
-      }
+      _mm_store_si128(reinterpret_cast<__m128i*>(b.at[j]), _mm_add_epi32(ShapedIndicesSse2<N>(b.cells[j], limit), kTableAt));
     }
-    for (std::size_t j = 0; j < m; ++j) ShapedPixelSse2<N>(p, cells[j], dst + (i + j) * out.bytes, out, limit);
+    WriteBlock(p, out, dst + i * out.bytes, m, b);
+  }
+}
+
+// CMYK in linear light with AVX: a K plane's node and the next plane's lie side by
+// side, so one 8-lane read holds both, the tetrahedron is interpolated in both planes
+// at once, and the next plane's lanes are moved down for the step between them. Each
+// lane sees the operations of the SSE2 kernel in the same order.
+__attribute__((target("avx2"))) inline __m128i CmykIndicesAvx2(const ShapedCell& cell, __m128 limit,
+                                                               __m256i next_plane) {
+  const ops::Simplex<3>& sx = cell.sx;
+  const float* c0 = cell.c;
+  const float* c1 = c0 + sx.step[0];
+  const float* c2 = c1 + sx.step[1];
+  const float* c3 = c2 + sx.step[2];
+  const __m256 n0 = _mm256_loadu_ps(c0), n1 = _mm256_loadu_ps(c1), n2 = _mm256_loadu_ps(c2), n3 = _mm256_loadu_ps(c3);
+  __m256 v = _mm256_add_ps(n0, _mm256_mul_ps(_mm256_sub_ps(n1, n0), _mm256_set1_ps(sx.w[0] * ops::kUnitWeight)));
+  v = _mm256_add_ps(v, _mm256_mul_ps(_mm256_sub_ps(n2, n1), _mm256_set1_ps(sx.w[1] * ops::kUnitWeight)));
+  v = _mm256_add_ps(v, _mm256_mul_ps(_mm256_sub_ps(n3, n2), _mm256_set1_ps(sx.w[2] * ops::kUnitWeight)));
+  const __m128 lo = _mm256_castps256_ps128(v);
+  const __m128 hi = _mm256_castps256_ps128(_mm256_permutevar8x32_ps(v, next_plane));
+  __m128 r = _mm_add_ps(lo, _mm_mul_ps(_mm_sub_ps(hi, lo), _mm_set1_ps(cell.k_weight)));
+  r = _mm_min_ps(_mm_max_ps(r, _mm_setzero_ps()), limit);
+  return _mm_cvttps_epi32(_mm_sqrt_ps(r));
+}
+
+__attribute__((target("avx2"))) void CmykBlocksAvx2(const FastPath& p, const std::uint8_t* src,
+                                                     const PixelLayout& in, std::uint8_t* dst, const PixelLayout& out,
+                                                     std::size_t n) {
+  const __m128 limit = _mm_set1_ps(p.limit);
+  const __m256i next_plane = _mm256_add_epi32(_mm256_setr_epi32(0, 1, 2, 3, 4, 4, 4, 4), _mm256_set1_epi32(p.stride[3]));
+  ShapedBlock b;
+  for (std::size_t i = 0; i < n; i += kShapedBlock) {
+    const std::size_t m = n - i < kShapedBlock ? n - i : kShapedBlock;
+    LocateBlock<4>(p, src + i * in.bytes, in, m, b);
+    for (std::size_t j = 0; j < m; ++j) {
+      _mm_store_si128(reinterpret_cast<__m128i*>(b.at[j]), _mm_add_epi32(CmykIndicesAvx2(b.cells[j], limit, next_plane), kTableAt));
+    }
+    WriteBlock(p, out, dst + i * out.bytes, m, b);
   }
 }
 
@@ -547,6 +609,7 @@ __attribute__((target("avx2"))) void RunAvx2(const FastPath& p, const std::uint8
   if (p.kind == Kind::Staged) {
     return StagedRun(p, src, in, dst, out, 0, n, StagedCurvePositionsAvx2, StagedCellsAvx2, StagedTrilinearAvx2);
   }
+  if (p.kind == Kind::ShapedClut4) return CmykBlocksAvx2(p, src, in, dst, out, n);
   if (p.kind == Kind::Matrix && p.out_channels == 3) MatrixRgbAvx2(p, src, in, dst, out, n, done);
   RunPerPixel(p, src, in, dst, out, done, n);
 }
