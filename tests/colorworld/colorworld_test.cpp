@@ -1,310 +1,195 @@
 // Colour worlds through the host: building them from profiles, matching CMColor values
-// and checking Lab colours, with the traces and codes a script sees.
-#include <lcms2.h>
-
-#include <cmath>
-
-#include "icm.h"
+// against Little CMS and checking Lab colours, with the traces and codes a script sees.
+#include "lcms_reference.h"
 #include "plugin_fixture.h"
 #include "profile_files.h"
 
 namespace {
 
 using host::Object;
-using host::Value;
+using Doubles = std::vector<double>;
+
+const char* const kCmyk = "ghostscript/default_cmyk.icc";
 
 class ColorWorldTest : public PluginTest {
  protected:
-  Object Open(const std::string& systemRelative) {
-    return rt->New("Profile", {rt->MakeFolderItem(std::string(TINTWELL_ICC_DIR) + "/" + systemRelative)});
-  }
+  Object Open(const std::string& systemRelative) { return PluginTest::Open(TINTWELL_ICC_DIR "/" + systemRelative); }
   Object Rgb(double r, double g, double b) {
     Object c = rt->New("CMColor");
-    rt->Set(c, "rr", r);
-    rt->Set(c, "rg", g);
-    rt->Set(c, "rb", b);
+    rt->Set(c, "rr", r), rt->Set(c, "rg", g), rt->Set(c, "rb", b);
     return c;
   }
-  double D(const Object& c, const char* p) { return rt->Get(c, p).AsDouble(); }
+  // A colour matched by w, read back through the views named.
+  Doubles Match(const Object& w, const Object& color, std::initializer_list<const char*> views) {
+    rt->Call(w, "MatchCMcolor", {color});
+    Doubles out;
+    for (const char* v : views) out.push_back(rt->Get(color, v).AsDouble());
+    return out;
+  }
   ProfileFiles files;  // keeps the colour directory private
 };
 
-TEST_F(ColorWorldTest, ConvertsSrgbToLabAndCmyk) {
-  Object srgb = Open("sRGB.icc");
-  Object lab = Open("LCMSLABI.ICM");
-  Object cmyk = Open("ghostscript/default_cmyk.icc");
-  Object d = Debugger();
-  Object toLab = rt->New("ColorWorld", {srgb, lab});
+// The reference's answer in doubles, scaled.
+Doubles Reference(const LcmsChain& chain, const void* in, std::size_t outChannels, double scale = 1) {
+  Doubles out(outChannels);
+  chain.Run(in, out.data());
+  for (double& v : out) v *= scale;
+  return out;
+}
+
+void ExpectNear(const Doubles& got, const Doubles& want, double tolerance) {
+  ASSERT_EQ(got.size(), want.size());
+  for (std::size_t k = 0; k < got.size(); ++k) EXPECT_NEAR(got[k], want[k], tolerance) << "channel " << k;
+}
+
+TEST_F(ColorWorldTest, BuildingTracesAndUnusableProfilesLeaveItEmpty) {
+  Object srgb = Open("sRGB.icc"), empty = rt->New("Profile", {nullptr}), d = Debugger();
+  Object ok = rt->New("ColorWorld", {srgb, srgb});
   EXPECT_EQ(Error(), 0);
   EXPECT_EQ(log.entries, (std::vector<std::string>{"DebugString: ", "DebugString:--->COLORWORLD CONSTRUCTOR",
                                                    "DebugString:Colorworld ERROR:", "DebugInteger:0"}));
-  const struct {
-    double r, g, b, L, a, bb;
-  } cases[] = {
-      {255, 255, 255, 100.0, 0.0, 0.0},
-      {0, 0, 0, 0.0, 0.0, 0.0},
-      {255, 0, 0, 54.29, 80.80, 69.89},  // sRGB red under D50 (relative colorimetric)
-      {128, 128, 128, 53.59, 0.0, 0.0},
-  };
-  for (const auto& c : cases) {
-    Object color = Rgb(c.r, c.g, c.b);
-    rt->Call(toLab, "MatchCMcolor", {color});
-    EXPECT_EQ(Error(), 0);
-    // Word encoding limits L to 1/652.8 and a, b to 1/256; the engine adds a little.
-    EXPECT_NEAR(D(color, "ll"), c.L, 0.6) << c.r << "," << c.g << "," << c.b;
-    EXPECT_NEAR(D(color, "la"), c.a, 0.6);
-    EXPECT_NEAR(D(color, "lb"), c.bb, 0.6);
+  for (const auto& [first, second, code, trace] :
+       {std::tuple{empty, srgb, -20, "Error: Could not open ICM profile 1"},
+        std::tuple{srgb, Object(), -21, "Error: Could not open ICM profile 2"}}) {
+    log.entries.clear();
+    Object w = rt->New("ColorWorld", {first, second});
+    EXPECT_EQ(Error(), code);
+    EXPECT_EQ(std::vector<std::string>(log.entries.end() - 2, log.entries.end()),
+              (std::vector<std::string>{std::string("DebugString:") + trace, "DebugError:" + std::to_string(code) + ","}));
   }
-
-  Object toCmyk = rt->New("ColorWorld", {srgb, cmyk});
-  EXPECT_EQ(Error(), 0);
-  Object white = Rgb(255, 255, 255);
-  rt->Call(toCmyk, "MatchCMcolor", {white});
-  for (const char* ch : {"cc", "cm", "cy", "ck"}) EXPECT_LT(D(white, ch), 0.02) << ch;
-  Object black = Rgb(0, 0, 0);
-  rt->Call(toCmyk, "MatchCMcolor", {black});
-  EXPECT_GT(D(black, "ck"), 0.7);
-  Object red = Rgb(255, 0, 0);
-  rt->Call(toCmyk, "MatchCMcolor", {red});
-  EXPECT_LT(D(red, "cc"), 0.1);
-  EXPECT_GT(D(red, "cm"), 0.8);
-  EXPECT_GT(D(red, "cy"), 0.8);
-}
-
-TEST_F(ColorWorldTest, UnusableProfilesLeaveTheColourWorldEmpty) {
-  Object srgb = Open("sRGB.icc");
-  Object empty = rt->New("Profile", {nullptr});
-  Object d = Debugger();
-  Object w = rt->New("ColorWorld", {empty, srgb});
-  EXPECT_EQ(Error(), -20);
-  ASSERT_GE(log.entries.size(), 2u);
-  EXPECT_EQ(log.entries[log.entries.size() - 2], "DebugString:Error: Could not open ICM profile 1");
-  EXPECT_EQ(log.entries.back(), "DebugError:-20,");
-  Object w2 = rt->New("ColorWorld", {srgb, nullptr});
+  Object w = rt->New("ColorWorld", {srgb, nullptr}), c = Rgb(1, 2, 3);
+  EXPECT_EQ(Match(w, c, {"rr"}), Doubles{1.0});
   EXPECT_EQ(Error(), -21);
-  EXPECT_EQ(log.entries[log.entries.size() - 2], "DebugString:Error: Could not open ICM profile 2");
-  EXPECT_EQ(log.entries.back(), "DebugError:-21,");
-  Object c = Rgb(1, 2, 3);
-  rt->Call(w2, "MatchCMcolor", {c});
-  EXPECT_EQ(Error(), -21);
-  EXPECT_EQ(D(c, "rr"), 1.0);
-  rt->Call(w2, "MatchCMcolor", {nullptr});
+  rt->Call(w, "MatchCMcolor", {nullptr});
   EXPECT_EQ(Error(), -1);
-  EXPECT_FALSE(rt->Call(w2, "CheckLAB", {50.0, 0.0, 0.0}).AsBoolean());
+  EXPECT_FALSE(rt->Call(w, "CheckLAB", {50.0, 0.0, 0.0}).AsBoolean());
   EXPECT_EQ(Error(), -21);
 
   // Rebuilding a built colour world says so before it starts.
-  Object built = rt->New("ColorWorld", {srgb, srgb});
-  rt->Call(built, "ColorWorld", {empty, srgb});
-  EXPECT_NE(std::find(log.entries.begin(), log.entries.end(), "DebugString:Deleteing colorworld"), log.entries.end());
-  rt->Call(built, "MatchCMcolor", {c});
+  rt->Call(ok, "ColorWorld", {empty, srgb});
+  EXPECT_TRUE(Traced("Deleteing colorworld"));
+  rt->Call(ok, "MatchCMcolor", {c});
   EXPECT_EQ(Error(), -21);  // the old transform is gone
 }
 
 TEST_F(ColorWorldTest, ConcatenationSkipsNilProfilesAndTakesTypesFromTheEnds) {
-  Object srgb = Open("sRGB.icc");
-  Object lab = Open("LCMSLABI.ICM");
-  Object cmyk = Open("ghostscript/default_cmyk.icc");
+  Object srgb = Open("sRGB.icc"), lab = Open("LCMSLABI.ICM"), cmyk = Open(kCmyk);
   Object w = rt->New("ColorWorld");
   rt->Call(w, "ConcatColorWorld", {0, nullptr, srgb, lab, nullptr});
   EXPECT_EQ(Error(), 0);
-  Object white = Rgb(255, 255, 255);
-  rt->Call(w, "MatchCMcolor", {white});
-  EXPECT_NEAR(D(white, "ll"), 100.0, 0.6);
-
+  EXPECT_NEAR(Match(w, Rgb(255, 255, 255), {"ll"})[0], 100.0, 0.6);
   rt->Call(w, "ConcatColorWorld", {0, srgb, lab, cmyk, nullptr});  // RGB → Lab → CMYK
   EXPECT_EQ(Error(), 0);
-  Object paper = Rgb(255, 255, 255);
-  rt->Call(w, "MatchCMcolor", {paper});
+  EXPECT_LT(Match(w, Rgb(255, 255, 255), {"ck"})[0], 0.02);
   EXPECT_EQ(Error(), 0);
-  EXPECT_LT(D(paper, "ck"), 0.02);
-
   rt->Call(w, "ConcatColorWorld", {0, nullptr, nullptr, nullptr, nullptr});
   EXPECT_EQ(Error(), 87);  // no profiles: the platform refuses with ERROR_INVALID_PARAMETER
-  rt->Call(w, "MatchCMcolor", {paper});
+  Match(w, Rgb(0, 0, 0), {});
   EXPECT_EQ(Error(), -21);
 
   Object made = rt->CallGlobal("NewConcatColorWorld", {0, srgb, nullptr, lab, nullptr}).AsObject();
   EXPECT_EQ(made.ClassName(), "ColorWorld");
-  Object grey = Rgb(128, 128, 128);
-  rt->Call(made, "MatchCMcolor", {grey});
+  EXPECT_NEAR(Match(made, Rgb(128, 128, 128), {"la"})[0], 0.0, 0.6);
   EXPECT_EQ(Error(), 0);
-  EXPECT_NEAR(D(grey, "la"), 0.0, 0.6);
-}
-
-TEST_F(ColorWorldTest, CheckLabTellsInFromOutOfGamut) {
-  Object lab = Open("LCMSLABI.ICM");
-  Object srgb = Open("sRGB.icc");
-  Object w = rt->New("ColorWorld", {lab, srgb});
-  EXPECT_TRUE(rt->Call(w, "CheckLAB", {50.0, 0.0, 0.0}).AsBoolean());
-  EXPECT_TRUE(rt->Call(w, "CheckLAB", {100.0, 0.0, 0.0}).AsBoolean());
-  EXPECT_FALSE(rt->Call(w, "CheckLAB", {50.0, 100.0, -100.0}).AsBoolean());
-  EXPECT_FALSE(rt->Call(w, "CheckLAB", {90.0, -80.0, 80.0}).AsBoolean());
-  EXPECT_EQ(Error(), 0);
-  EXPECT_EQ(rt->Get(w, "CMMcount").AsInteger(), 1);
 }
 
 // Without a transform there is no answer: false must come with an error and a trace,
 // and the next check that can be made clears it.
-TEST_F(ColorWorldTest, CheckLabWithoutATransformReportsIt) {
-  Object lab = Open("LCMSLABI.ICM");
-  Object srgb = Open("sRGB.icc");
-  Object d = Debugger();
-  Object empty = rt->New("ColorWorld");
-  EXPECT_FALSE(rt->Call(empty, "CheckLAB", {50.0, 0.0, 0.0}).AsBoolean());
+TEST_F(ColorWorldTest, CheckLabTellsInFromOutOfGamut) {
+  Object lab = Open("LCMSLABI.ICM"), srgb = Open("sRGB.icc"), d = Debugger();
+  EXPECT_FALSE(rt->Call(rt->New("ColorWorld"), "CheckLAB", {50.0, 0.0, 0.0}).AsBoolean());
   EXPECT_EQ(Error(), -21);
   EXPECT_EQ(log.entries,
             (std::vector<std::string>{"DebugString:Error: Colorworld has no transform", "DebugError:-21,"}));
   Object w = rt->New("ColorWorld", {lab, srgb});
-  EXPECT_TRUE(rt->Call(w, "CheckLAB", {50.0, 0.0, 0.0}).AsBoolean());
+  const struct {
+    double L, a, b;
+    bool in;
+  } cases[] = {{50, 0, 0, true}, {100, 0, 0, true}, {50, 100, -100, false}, {90, -80, 80, false}};
+  for (const auto& c : cases) EXPECT_EQ(rt->Call(w, "CheckLAB", {c.L, c.a, c.b}).AsBoolean(), c.in) << c.L << c.a;
+  EXPECT_EQ(Error(), 0);
+  rt->Call(w, "MatchCMcolor", {nullptr});  // leaves -1, which CMMcount clears
+  EXPECT_EQ(rt->Get(w, "CMMcount").AsInteger(), 1);
   EXPECT_EQ(Error(), 0);
 }
 
-TEST_F(ColorWorldTest, LinkColorWorldNeedsADeviceLink) {
-  Object srgb = Open("sRGB.icc");
-  Object d = Debugger();
-  Object w = rt->New("ColorWorld");
+// A device link's data space goes in and its connection-space field, the link's output
+// space, comes out; anything else leaves the colour world empty with -20.
+TEST_F(ColorWorldTest, LinkColorWorldTakesOnlyADeviceLink) {
+  Object srgb = Open("sRGB.icc"), lab = Open("LCMSLABI.ICM"), d = Debugger(), w = rt->New("ColorWorld");
   rt->Call(w, "LinkColorWorld", {srgb});
   EXPECT_EQ(Error(), -20);
-  ASSERT_GE(log.entries.size(), 2u);
-  EXPECT_EQ(log.entries[log.entries.size() - 2], "DebugString:Error: Not a device link profile");
+  EXPECT_TRUE(Traced("Error: Not a device link profile"));
+  log.entries.clear();
   rt->Call(w, "LinkColorWorld", {nullptr});
   EXPECT_EQ(Error(), -20);
+  EXPECT_TRUE(Traced("Error: Could not open ICM profile 1"));
+  const std::string path = files.Path("link.icc");
+  Object link = rt->CallGlobal("NewLinkProfile", {rt->MakeFolderItem(path), 0, srgb, lab, nullptr, nullptr}).AsObject();
+  rt->Call(w, "LinkColorWorld", {link});
+  EXPECT_EQ(Error(), 0);
+  ExpectNear(Match(w, Rgb(255, 255, 255), {"ll", "la", "lb"}), {100, 0, 0}, 0.6);
 }
 
-}  // namespace
-
-namespace {
-
-using host::Object;
-
-// Little CMS called directly in double precision: the independent expectation.
-class LcmsChain {
- public:
-  // Each profile's intent is its header's unless given.
-  LcmsChain(const std::vector<std::string>& files, cmsUInt32Number in, cmsUInt32Number out,
-            std::vector<cmsUInt32Number> given = {}) {
-    std::vector<cmsHPROFILE> profiles;
-    std::vector<cmsUInt32Number> intents;
-    std::vector<cmsBool> bpc;
-    std::vector<cmsFloat64Number> adaptation;
-    for (const std::string& f : files) {
-      profiles.push_back(cmsOpenProfileFromFile((std::string(TINTWELL_ICC_DIR) + "/" + f).c_str(), "r"));
-      intents.push_back(given.empty() ? cmsGetHeaderRenderingIntent(profiles.back()) : given[intents.size()]);
-      bpc.push_back(FALSE);
-      adaptation.push_back(1.0);
-    }
-    transform_ = cmsCreateExtendedTransform(nullptr, static_cast<cmsUInt32Number>(profiles.size()), profiles.data(),
-                                            bpc.data(), intents.data(), adaptation.data(), nullptr, 0, in, out,
-                                            cmsFLAGS_NOCACHE);
-    for (cmsHPROFILE p : profiles) cmsCloseProfile(p);
-  }
-  ~LcmsChain() {
-    if (transform_) cmsDeleteTransform(transform_);
-  }
-  std::vector<double> Run(std::vector<double> in, std::size_t outChannels) const {
-    std::vector<double> out(outChannels);
-    cmsDoTransform(transform_, in.data(), out.data(), 1);
-    return out;
-  }
-  void RunRaw(const void* in, void* out) const { cmsDoTransform(transform_, in, out, 1); }
-  bool ok() const { return transform_ != nullptr; }
-
- private:
-  cmsHTRANSFORM transform_ = nullptr;
-};
-
+// The Lab words hold L to 1/652.8 and a, b to 1/256, truncated on the way in and rounded
+// on the way out; 0.01 covers both with room to spare.
 TEST_F(ColorWorldTest, MatchesLittleCmsInDoublePrecision) {
-  Object srgb = Open("sRGB.icc");
-  Object lab = Open("LCMSLABI.ICM");
-  Object cmyk = Open("ghostscript/default_cmyk.icc");
-  Object toLab = rt->New("ColorWorld", {srgb, lab});
-  Object viaCmyk = rt->New("ColorWorld");
+  Object srgb = Open("sRGB.icc"), lab = Open("LCMSLABI.ICM"), cmyk = Open(kCmyk);
+  Object toLab = rt->New("ColorWorld", {srgb, lab}), viaCmyk = rt->New("ColorWorld");
   // A proof: into the printer's CMYK and back out of it, so the printer appears twice.
   rt->Call(viaCmyk, "ConcatColorWorld", {0, srgb, cmyk, cmyk, lab});
   ASSERT_EQ(Error(), 0);
   const LcmsChain direct({"sRGB.icc", "LCMSLABI.ICM"}, TYPE_RGB_DBL, TYPE_Lab_DBL);
-  const LcmsChain printed(
-      {"sRGB.icc", "ghostscript/default_cmyk.icc", "ghostscript/default_cmyk.icc", "LCMSLABI.ICM"}, TYPE_RGB_DBL,
-      TYPE_Lab_DBL);
-  ASSERT_TRUE(direct.ok() && printed.ok());
-
+  const LcmsChain printed({"sRGB.icc", kCmyk, kCmyk, "LCMSLABI.ICM"}, TYPE_RGB_DBL, TYPE_Lab_DBL);
   const double colors[][3] = {{255, 255, 255}, {255, 0, 0}, {0, 255, 0}, {0, 0, 255},
                               {0, 0, 0},       {12, 200, 99}, {180, 30, 250}};
   for (const auto& c : colors) {
-    for (const auto* chain : {&direct, &printed}) {
-      Object color = Rgb(c[0], c[1], c[2]);
-      rt->Call(chain == &direct ? toLab : viaCmyk, "MatchCMcolor", {color});
-      const auto expected = chain->Run({c[0] / 255, c[1] / 255, c[2] / 255}, 3);
-      // The Lab words hold L to 1/652.8 and a, b to 1/256, truncated on the way in and
-      // rounded on the way out; 0.01 covers both with room to spare.
-      EXPECT_NEAR(D(color, "ll"), expected[0], 0.01) << c[0] << " " << c[1] << " " << c[2];
-      EXPECT_NEAR(D(color, "la"), expected[1], 0.01) << c[0] << " " << c[1] << " " << c[2];
-      EXPECT_NEAR(D(color, "lb"), expected[2], 0.01) << c[0] << " " << c[1] << " " << c[2];
-    }
+    SCOPED_TRACE(std::to_string(c[0]) + " " + std::to_string(c[1]) + " " + std::to_string(c[2]));
+    const double in[3] = {c[0] / 255, c[1] / 255, c[2] / 255};
+    ExpectNear(Match(toLab, Rgb(c[0], c[1], c[2]), {"ll", "la", "lb"}), Reference(direct, in, 3), 0.01);
+    ExpectNear(Match(viaCmyk, Rgb(c[0], c[1], c[2]), {"ll", "la", "lb"}), Reference(printed, in, 3), 0.01);
   }
 }
 
 TEST_F(ColorWorldTest, ANamedColourProfileTakesColourIndexes) {
-  Object names = Open("colord/x11-colors.icc");
-  Object srgb = Open("sRGB.icc");
-  Object w = rt->New("ColorWorld", {names, srgb});
+  Object w = rt->New("ColorWorld", {Open("colord/x11-colors.icc"), Open("sRGB.icc")});
   ASSERT_EQ(Error(), 0);
   const LcmsChain expected({"colord/x11-colors.icc", "sRGB.icc"}, TYPE_NAMED_COLOR_INDEX, TYPE_RGB_DBL);
-  ASSERT_TRUE(expected.ok());
   for (int index : {1, 2, 50}) {
     Object color = rt->New("CMColor");
     rt->Set(color, "namedindex", index);
-    rt->Call(w, "MatchCMcolor", {color});
+    const cmsUInt16Number zeroBased = cmsUInt16Number(index - 1);
+    ExpectNear(Match(w, color, {"rr", "rg", "rb"}), Reference(expected, &zeroBased, 3, 255), 0.01);
     EXPECT_EQ(Error(), 0) << index;
-    cmsUInt16Number zeroBased = static_cast<cmsUInt16Number>(index - 1);
-    std::vector<double> want(3);
-    expected.RunRaw(&zeroBased, want.data());
-    EXPECT_NEAR(D(color, "rr"), want[0] * 255, 0.01) << index;
-    EXPECT_NEAR(D(color, "rg"), want[1] * 255, 0.01) << index;
-    EXPECT_NEAR(D(color, "rb"), want[2] * 255, 0.01) << index;
   }
 }
 
 TEST_F(ColorWorldTest, RoundTripThroughLabKeepsEightBitLevels) {
-  Object srgb = Open("sRGB.icc");
-  Object lab = Open("LCMSLABI.ICM");
-  Object there = rt->New("ColorWorld", {srgb, lab});
-  Object back = rt->New("ColorWorld", {lab, srgb});
+  Object srgb = Open("sRGB.icc"), lab = Open("LCMSLABI.ICM");
+  Object there = rt->New("ColorWorld", {srgb, lab}), back = rt->New("ColorWorld", {lab, srgb});
   for (int r = 0; r <= 255; r += 51)
     for (int g = 0; g <= 255; g += 51)
       for (int b = 0; b <= 255; b += 51) {
         Object color = Rgb(r, g, b);
         rt->Call(there, "MatchCMcolor", {color});
-        rt->Call(back, "MatchCMcolor", {color});
-        EXPECT_NEAR(D(color, "rr"), r, 1.0) << r << " " << g << " " << b;
-        EXPECT_NEAR(D(color, "rg"), g, 1.0) << r << " " << g << " " << b;
-        EXPECT_NEAR(D(color, "rb"), b, 1.0) << r << " " << g << " " << b;
+        ExpectNear(Match(back, color, {"rr", "rg", "rb"}), {double(r), double(g), double(b)}, 1.0);
       }
 }
 
 TEST_F(ColorWorldTest, EachProfilesIntentReachesTheEngine) {
-  Object srgb = Open("sRGB.icc");
-  Object cmyk = Open("ghostscript/default_cmyk.icc");
-  auto ink = [&](int srcIntent, int dstIntent) {
-    rt->Set(srgb, "RenderIntent", srcIntent);
-    rt->Set(cmyk, "RenderIntent", dstIntent);
-    Object w = rt->New("ColorWorld", {srgb, cmyk});
-    Object c = Rgb(20, 220, 60);
-    rt->Call(w, "MatchCMcolor", {c});
-    return std::vector<double>{D(c, "cc"), D(c, "cm"), D(c, "cy"), D(c, "ck")};
-  };
+  Object srgb = Open("sRGB.icc"), cmyk = Open(kCmyk);
   const int cases[][2] = {{INTENT_PERCEPTUAL, INTENT_SATURATION},
                           {INTENT_PERCEPTUAL, INTENT_ABSOLUTE_COLORIMETRIC},
                           {INTENT_RELATIVE_COLORIMETRIC, INTENT_RELATIVE_COLORIMETRIC}};
-  std::vector<std::vector<double>> results;
+  std::vector<Doubles> results;
+  const double in[3] = {20 / 255.0, 220 / 255.0, 60 / 255.0};
   for (const auto& c : cases) {
-    const LcmsChain expected({"sRGB.icc", "ghostscript/default_cmyk.icc"}, TYPE_RGB_DBL, TYPE_CMYK_DBL,
-                             {static_cast<cmsUInt32Number>(c[0]), static_cast<cmsUInt32Number>(c[1])});
-    const auto want = expected.Run({20 / 255.0, 220 / 255.0, 60 / 255.0}, 4);
-    const auto got = ink(c[0], c[1]);
-    for (int k = 0; k < 4; ++k) EXPECT_NEAR(got[k], want[k] / 100.0, 1.0 / 65535 + 1e-9) << c[0] << "," << c[1];
-    results.push_back(got);
+    rt->Set(srgb, "RenderIntent", c[0]);
+    rt->Set(cmyk, "RenderIntent", c[1]);
+    const LcmsChain expected({"sRGB.icc", kCmyk}, TYPE_RGB_DBL, TYPE_CMYK_DBL,
+                             {cmsUInt32Number(c[0]), cmsUInt32Number(c[1])});
+    results.push_back(Match(rt->New("ColorWorld", {srgb, cmyk}), Rgb(20, 220, 60), {"cc", "cm", "cy", "ck"}));
+    ExpectNear(results.back(), Reference(expected, in, 4, 0.01), 1.0 / 65535 + 1e-9);
   }
   EXPECT_NE(results[0], results[1]);  // the printer's intent alone changes the result
 }

@@ -1,12 +1,12 @@
 // MatchPicture through the host: pixels against Little CMS (red and blue must not trade
 // places), the row padding of odd widths, areas larger than the picture, and the
 // failure table with its traces and codes.
-#include <lcms2.h>
-
 #include <cstdint>
 #include <cstdlib>
 #include <random>
+#include <tuple>
 
+#include "lcms_reference.h"
 #include "plugin_fixture.h"
 #include "profile_files.h"
 
@@ -20,11 +20,8 @@ const char* const kWide = "colord/ProPhotoRGB.icc";
 
 class PictureMatchTest : public PluginTest {
  protected:
-  Object Open(const std::string& name) {
-    return rt->New("Profile", {rt->MakeFolderItem(std::string(TINTWELL_ICC_DIR) + "/" + name)});
-  }
-  Object World(const char* from = "sRGB.icc", const char* to = kWide) {
-    return rt->New("ColorWorld", {Open(from), Open(to)});
+  Object World() {
+    return rt->New("ColorWorld", {Open(TINTWELL_ICC_DIR "/sRGB.icc"), Open(TINTWELL_ICC_DIR "/" + std::string(kWide))});
   }
   Value Match(const Object& world, const Value& picture, int w, int h, int depth = 32, bool transparent = false) {
     return rt->Call(world, "MatchPicture", {picture, w, h, depth, transparent});
@@ -32,24 +29,14 @@ class PictureMatchTest : public PluginTest {
   ProfileFiles files;
 };
 
-// Little CMS on the same pixels, each profile with its header's intent, as the colour
+// Little CMS on the same pixel, each profile with its header's intent, as the colour
 // world builds its transform. Pixels are &h00RRGGBB.
-std::uint32_t Expected(const char* from, const char* to, std::uint32_t rgb) {
-  cmsHPROFILE p[2] = {cmsOpenProfileFromFile((std::string(TINTWELL_ICC_DIR) + "/" + from).c_str(), "r"),
-                      cmsOpenProfileFromFile((std::string(TINTWELL_ICC_DIR) + "/" + to).c_str(), "r")};
-  cmsUInt32Number intents[2] = {cmsGetHeaderRenderingIntent(p[0]), cmsGetHeaderRenderingIntent(p[1])};
-  cmsBool bpc[2] = {FALSE, FALSE};
-  cmsFloat64Number adaptation[2] = {1.0, 1.0};
-  cmsHTRANSFORM x = cmsCreateExtendedTransform(nullptr, 2, p, bpc, intents, adaptation, nullptr, 0, TYPE_RGB_8,
-                                               TYPE_RGB_8, cmsFLAGS_NOCACHE);
-  const std::uint8_t in[3] = {static_cast<std::uint8_t>(rgb >> 16), static_cast<std::uint8_t>(rgb >> 8),
-                              static_cast<std::uint8_t>(rgb)};
+std::uint32_t Expected(std::uint32_t rgb) {
+  static const LcmsChain chain({"sRGB.icc", kWide}, TYPE_RGB_8, TYPE_RGB_8);
+  const std::uint8_t in[3] = {std::uint8_t(rgb >> 16), std::uint8_t(rgb >> 8), std::uint8_t(rgb)};
   std::uint8_t out[3] = {};
-  cmsDoTransform(x, in, out, 1);
-  cmsDeleteTransform(x);
-  cmsCloseProfile(p[0]);
-  cmsCloseProfile(p[1]);
-  return static_cast<std::uint32_t>(out[0]) << 16 | out[1] << 8 | out[2];
+  chain.Run(in, out);
+  return std::uint32_t(out[0]) << 16 | out[1] << 8 | out[2];
 }
 
 // Channel by channel within one step of 8 bits: the engine's 8-bit path may round
@@ -90,12 +77,10 @@ TEST_F(PictureMatchTest, MatchesLittleCmsWithRedAndBlueInTheirPlaces) {
     EXPECT_EQ(log.entries, std::vector<std::string>{"DebugString:BuildImageDataFromPicture"});
     const Object& picture = result.AsObject();
     const auto size = rt->SizeOfPicture(picture);
-    EXPECT_EQ(size.width, width);
-    EXPECT_EQ(size.height, height);
-    EXPECT_EQ(size.depth, 32);
+    EXPECT_EQ(std::tie(size.width, size.height, size.depth), std::make_tuple(width, height, 32));
     for (int y = 0, i = 0; y < height; ++y)
       for (int x = 0; x < width; ++x, ++i) {
-        EXPECT_TRUE(Near(rt->GetPixel(picture, x, y).rgb, Expected("sRGB.icc", kWide, given[i]))) << x << "," << y;
+        EXPECT_TRUE(Near(rt->GetPixel(picture, x, y).rgb, Expected(given[i]))) << x << "," << y;
         EXPECT_EQ(rt->GetPixel(source, x, y).rgb, given[i]);  // the source is only read
       }
     // Pure red and pure blue land far apart in a wide gamut: a swap cannot pass as rounding.
@@ -113,11 +98,10 @@ TEST_F(PictureMatchTest, AreaBeyondThePictureReadsAsWhiteAndDepthIsAlways32) {
   const Value result = Match(world, source, 3, 4, 8, true);
   ASSERT_TRUE(result.IsObject());
   const Object& picture = result.AsObject();
-  EXPECT_EQ(rt->SizeOfPicture(picture).width, 3);
-  EXPECT_EQ(rt->SizeOfPicture(picture).height, 4);
-  EXPECT_EQ(rt->SizeOfPicture(picture).depth, 32);
-  const std::uint32_t inside = Expected("sRGB.icc", kWide, 0x102030);
-  const std::uint32_t white = Expected("sRGB.icc", kWide, 0xFFFFFF);
+  const auto size = rt->SizeOfPicture(picture);
+  EXPECT_EQ(std::tie(size.width, size.height, size.depth), std::make_tuple(3, 4, 32));
+  const std::uint32_t inside = Expected(0x102030);
+  const std::uint32_t white = Expected(0xFFFFFF);
   for (int y = 0; y < 4; ++y)
     for (int x = 0; x < 3; ++x)
       EXPECT_TRUE(Near(rt->GetPixel(picture, x, y).rgb, x < 2 && y < 2 ? inside : white)) << x << "," << y;

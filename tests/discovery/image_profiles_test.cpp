@@ -1,6 +1,5 @@
 // Profiles in PNG, JPEG and TIFF files through the plugin: counting, the space,
 // embedding without touching the pixels, extracting to a Profile, and hostile files.
-#include <dirent.h>
 #include <zlib.h>
 
 #include <set>
@@ -28,14 +27,7 @@ class ImageProfiles : public PluginTest {
   bool Embed(const std::string& from, const std::string& to, bool replace, const Object& p) {
     return rt->CallGlobal("EmbedImage", {Item(from), Item(to), replace, p}).AsBoolean();
   }
-  std::set<std::string> Listing() {
-    std::set<std::string> names;
-    DIR* dir = opendir(files.Path("").c_str());
-    while (const dirent* e = readdir(dir))
-      if (e->d_name[0] != '.') names.insert(e->d_name);
-    closedir(dir);
-    return names;
-  }
+  std::set<std::string> Listing() { return ProfileFiles::Listing(files.Path("")); }
 
   ProfileFiles files;
 };
@@ -44,19 +36,18 @@ struct Case {
   Kind kind;
   const char* name;
   int channels;
-  const char* ownSpace;
+  const char* space;    // the image's, and its profile's
   const char* profile;  // fits the image's space
-  const char* profileSpace;
 };
 const Case kCases[] = {
-    {Kind::Png, "rgb.png", 3, "RGB ", "sRGB.icc", "RGB "},
-    {Kind::Png, "gray.png", 1, "GRAY", "Gray.icc", "GRAY"},
-    {Kind::Jpeg, "rgb.jpg", 3, "RGB ", "sRGB.icc", "RGB "},
-    {Kind::Jpeg, "gray.jpg", 1, "GRAY", "Gray.icc", "GRAY"},
-    {Kind::Jpeg, "cmyk.jpg", 4, "CMYK", "ghostscript/default_cmyk.icc", "CMYK"},
-    {Kind::Tiff, "rgb.tif", 3, "RGB ", "sRGB.icc", "RGB "},
-    {Kind::Tiff, "cmyk.tif", 4, "CMYK", "ghostscript/default_cmyk.icc", "CMYK"},
-    {Kind::BigTiff, "gray.btf", 1, "GRAY", "Gray.icc", "GRAY"},
+    {Kind::Png, "rgb.png", 3, "RGB ", "sRGB.icc"},
+    {Kind::Png, "gray.png", 1, "GRAY", "Gray.icc"},
+    {Kind::Jpeg, "rgb.jpg", 3, "RGB ", "sRGB.icc"},
+    {Kind::Jpeg, "gray.jpg", 1, "GRAY", "Gray.icc"},
+    {Kind::Jpeg, "cmyk.jpg", 4, "CMYK", "ghostscript/default_cmyk.icc"},
+    {Kind::Tiff, "rgb.tif", 3, "RGB ", "sRGB.icc"},
+    {Kind::Tiff, "cmyk.tif", 4, "CMYK", "ghostscript/default_cmyk.icc"},
+    {Kind::BigTiff, "gray.btf", 1, "GRAY", "Gray.icc"},
 };
 
 // Embedding keeps the pixels and writes the profile byte for byte; a second embedding
@@ -69,19 +60,19 @@ TEST_F(ImageProfiles, EmbedReadBackAndExtractInEachFormat) {
     testimage::Make(c.kind, files.Path(plain), 37, 23, c.channels, {});
     EXPECT_EQ(Count(plain), 0);
     EXPECT_EQ(Error(), 0);
-    EXPECT_EQ(Space(plain).AsString(), c.ownSpace);
+    EXPECT_EQ(Space(plain).AsString(), c.space);
 
     const Bytes profileBytes = SystemProfile(c.profile);
     Object p = rt->New("Profile", {rt->MakeFolderItem(files.Copy(c.profile, "p.icc"))});
     ASSERT_TRUE(Embed(plain, with, false, p));
     EXPECT_EQ(Error(), 0);
-    const testimage::Decoded before = testimage::Read(c.kind, files.Path(plain));
-    const testimage::Decoded after = testimage::Read(c.kind, files.Path(with));
+    const testimage::Image before = testimage::Read(c.kind, files.Path(plain));
+    const testimage::Image after = testimage::Read(c.kind, files.Path(with));
     ASSERT_TRUE(after.ok);
-    EXPECT_EQ(after.profile, profileBytes);
-    EXPECT_EQ(after.pixels, before.pixels);
+    EXPECT_EQ(after.icc, profileBytes);
+    EXPECT_EQ(after.samples, before.samples);
     EXPECT_EQ(Count(with), 1);
-    EXPECT_EQ(Space(with).AsString(), c.profileSpace);
+    EXPECT_EQ(Space(with).AsString(), c.space);
 
     // Without replace: False, and the file is left as it is.
     const Bytes written = testimage::ReadFile(files.Path(with));
@@ -91,7 +82,7 @@ TEST_F(ImageProfiles, EmbedReadBackAndExtractInEachFormat) {
 
     // Extracting: a Profile on a copy of the embedded bytes, deleted with the object.
     Object got = rt->CallGlobal("GetImageProfile", {Item(with), 1}).AsObject();
-    EXPECT_EQ(rt->Get(got, "ColorSpace").AsString(), c.profileSpace);
+    EXPECT_EQ(rt->Get(got, "ColorSpace").AsString(), c.space);
     const std::string copy = *win32::PosixPathFromWindows(rt->FolderItemPath(rt->Get(got, "Location").AsObject()));
     EXPECT_EQ(testimage::ReadFile(copy), profileBytes);
     got = Object();
@@ -103,9 +94,9 @@ TEST_F(ImageProfiles, EmbedReadBackAndExtractInEachFormat) {
     if (c.kind != Kind::Png) {
       Object q = rt->New("Profile", {rt->MakeFolderItem(files.Copy("ITULab.icc", "lab.icc"))});
       ASSERT_TRUE(Embed(with, with, true, q));
-      const testimage::Decoded replaced = testimage::Read(c.kind, files.Path(with));
-      EXPECT_EQ(replaced.profile, lab);
-      EXPECT_EQ(replaced.pixels, before.pixels);
+      const testimage::Image replaced = testimage::Read(c.kind, files.Path(with));
+      EXPECT_EQ(replaced.icc, lab);
+      EXPECT_EQ(replaced.samples, before.samples);
     }
   }
   EXPECT_EQ(Listing().count("p.icc"), 1u);

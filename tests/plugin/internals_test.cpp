@@ -11,6 +11,7 @@
 #include "debugger.h"
 #include "error_state.h"
 #include "plugin_fixture.h"
+#include "profile_files.h"
 #include "temp_folder.h"
 
 namespace {
@@ -21,15 +22,6 @@ using host::Value;
 class InternalsTest : public PluginTest {
  protected:
   InternalsTest() : PluginTest("") {}
-
-  // A registered debugger whose events land in log; the registration texts are dropped.
-  Object Register(bool useErrorEvent = true) {
-    Object d = rt->New("halvoDebugger", {useErrorEvent});
-    log.Attach(*rt, d);
-    rt->CallGlobal("halvoRegisterDebugger", {d});
-    log.entries.clear();
-    return d;
-  }
 };
 
 TEST_F(InternalsTest, SendersWithoutADebuggerNeverAskForHandlers) {
@@ -41,11 +33,11 @@ TEST_F(InternalsTest, SendersWithoutADebuggerNeverAskForHandlers) {
   SendDebugBoolean(true);
   SetCMError(-1);
   EXPECT_EQ(rt->EventLookups(), before);
-  EXPECT_EQ(rt->CallGlobal("CMError").AsInteger(), -1);  // still reported
+  EXPECT_EQ(Error(), -1);  // still reported
 }
 
 TEST_F(InternalsTest, EachSenderRaisesItsEventWithTheValue) {
-  Register();
+  Debugger();
   SendDebugString("Colorworld ERROR:");
   SendDebugInteger(-2147483647 - 1);
   SendDebugDouble(0.25);
@@ -57,7 +49,7 @@ TEST_F(InternalsTest, EachSenderRaisesItsEventWithTheValue) {
 }
 
 TEST_F(InternalsTest, UseErrorEventGatesOnlyDebugError) {
-  Object d = Register(false);
+  Object d = Debugger(false);
   SetCMError(-21);
   SendDebugInteger(5);
   EXPECT_EQ(log.entries, (std::vector<std::string>{"DebugInteger:5"}));
@@ -67,45 +59,42 @@ TEST_F(InternalsTest, UseErrorEventGatesOnlyDebugError) {
 }
 
 TEST_F(InternalsTest, SetCMErrorStoresFirstAndRaisesNothingForZero) {
-  Object d = Register();
+  Object d = Debugger();
   int32_t seenInHandler = 12345;
   rt->SetEventHandler(d, "DebugError", [&](const Object&, const std::vector<Value>& args) {
-    seenInHandler = rt->CallGlobal("CMError").AsInteger();  // a handler may call back in
+    seenInHandler = Error();  // a handler may call back in
     EXPECT_EQ(args[0].AsInteger(), seenInHandler);
     EXPECT_EQ(args[1].AsString(), "");
     return Value();
   });
-  SetCMError(0);
-  EXPECT_EQ(seenInHandler, 12345);
-  SetCMError(2011);
-  EXPECT_EQ(seenInHandler, 2011);
-  SetCMError(-404);
-  EXPECT_EQ(seenInHandler, -404);
-  EXPECT_EQ(rt->CallGlobal("CMError").AsInteger(), -404);
-  EXPECT_EQ(rt->CallGlobal("CMError").AsInteger(), -404);  // reading does not clear it
+  for (int32_t code : {0, 2011, -404}) {
+    SetCMError(code);
+    EXPECT_EQ(seenInHandler, code ? code : 12345);
+  }
+  EXPECT_EQ(Error(), -404);
+  EXPECT_EQ(Error(), -404);  // reading does not clear it
 }
 
 TEST_F(InternalsTest, TemporaryNamesCountFromZeroAfterStartUp) {
   ASSERT_GT(std::strlen(WorkingFolderPath), 0u);
   const std::string folder = WorkingFolderPath;
-  char name[MAX_PATH];
-  ASSERT_TRUE(MakeTempName(name, sizeof name));
-  EXPECT_EQ(std::string(name), folder + "0");
-  ASSERT_TRUE(MakeTempName(name, sizeof name));
-  EXPECT_EQ(std::string(name), folder + "1");
-  // Too small for the name: refused, and the number is not used up.
-  char tiny[4];
+  char name[MAX_PATH], tiny[4];
+  const auto next = [&](const char* number) {
+    ASSERT_TRUE(MakeTempName(name, sizeof name));
+    EXPECT_EQ(std::string(name), folder + number);
+  };
+  next("0");
+  next("1");
+  // Too small for the name, or no buffer: refused, and the number is not used up.
   EXPECT_FALSE(MakeTempName(tiny, sizeof tiny));
-  ASSERT_TRUE(MakeTempName(name, sizeof name));
-  EXPECT_EQ(std::string(name), folder + "2");
   EXPECT_FALSE(MakeTempName(nullptr, sizeof name));
   EXPECT_FALSE(MakeTempName(name, 0));
+  next("2");
   // Without a working folder of its own the plugin names no copy at all.
   WorkingFolderPath[0] = '\0';
   EXPECT_FALSE(MakeTempName(name, sizeof name));
   std::strcpy(WorkingFolderPath, folder.c_str());
-  ASSERT_TRUE(MakeTempName(name, sizeof name));
-  EXPECT_EQ(std::string(name), folder + "3");
+  next("3");
 }
 
 // Without a template to copy (none in the folder, or a folder whose path leaves no room
@@ -114,9 +103,9 @@ TEST_F(InternalsTest, TemporaryNamesCountFromZeroAfterStartUp) {
 TEST_F(InternalsTest, BlankProfileWithoutATemplateLeavesTheFileAlone) {
   char saved[sizeof TempFolderPath];
   std::memcpy(saved, TempFolderPath, sizeof saved);
-  const std::string empty = ::testing::TempDir() + "tw_empty_" + std::to_string(getpid());
+  ProfileFiles files;
+  const std::string empty = files.Path("empty"), f = files.Path("blank.icc");
   ASSERT_EQ(mkdir(empty.c_str(), 0755), 0);
-  const std::string f = ::testing::TempDir() + "tw_blank_" + std::to_string(getpid()) + ".icc";
   const struct {
     std::string folder;
     int code;
@@ -126,30 +115,18 @@ TEST_F(InternalsTest, BlankProfileWithoutATemplateLeavesTheFileAlone) {
   };
   for (const auto& c : cases) {
     std::memcpy(TempFolderPath, c.folder.c_str(), c.folder.size() + 1);
-    std::FILE* out = std::fopen(f.c_str(), "wb");
-    ASSERT_NE(out, nullptr);
-    std::fputs("mine", out);
-    std::fclose(out);
-    {
-      const Value blank = rt->CallGlobal("BlankProfile", {rt->MakeFolderItem(f)});
-      EXPECT_TRUE(blank.IsObject());
-      EXPECT_EQ(rt->CallGlobal("CMError").AsInteger(), c.code);
-    }
-    char text[8] = {};
-    out = std::fopen(f.c_str(), "rb");
-    ASSERT_NE(out, nullptr);
-    EXPECT_EQ(std::fread(text, 1, sizeof text, out), 4u);
-    std::fclose(out);
-    EXPECT_STREQ(text, "mine");
+    ProfileFiles::Write(f, {'m', 'i', 'n', 'e'});
+    const Value blank = rt->CallGlobal("BlankProfile", {rt->MakeFolderItem(f)});
+    EXPECT_TRUE(blank.IsObject());
+    EXPECT_EQ(Error(), c.code);
+    EXPECT_EQ(ProfileFiles::Read(f), (std::vector<char>{'m', 'i', 'n', 'e'}));
   }
   std::memcpy(TempFolderPath, saved, sizeof saved);
-  std::remove(f.c_str());
-  rmdir(empty.c_str());
 }
 
 // The template is placed only under a name that fits, and never over a file there.
 TEST(BlankTemplate, IsPlacedWholeOnlyWhereItFitsAndNoFileIsThere) {
-  const std::string dir = ::testing::TempDir() + "tw_tmpl_" + std::to_string(getpid());
+  const std::string dir = ::testing::TempDir() + "tw_tmpl_" + std::to_string(getpid()), placed = dir + "/blank.icc";
   ASSERT_EQ(mkdir(dir.c_str(), 0755), 0);
   const std::string win = "Z:" + dir + "\\";  // TempDir is absolute; slashes pass as separators
   const std::string deep = "Z:\\" + std::string(MAX_PATH - 10, 'd') + "\\";
@@ -157,16 +134,11 @@ TEST(BlankTemplate, IsPlacedWholeOnlyWhereItFitsAndNoFileIsThere) {
   EXPECT_FALSE(PlaceBlankTemplate(win.c_str(), deep.c_str()));
   EXPECT_FALSE(PlaceBlankTemplate("", win.c_str()));
   EXPECT_TRUE(PlaceBlankTemplate(win.c_str(), win.c_str()));
-  struct stat st;
-  ASSERT_EQ(stat((dir + "/blank.icc").c_str(), &st), 0);
-  EXPECT_EQ(static_cast<std::size_t>(st.st_size), BlankTemplateBytes().size());
-  std::FILE* mine = std::fopen((dir + "/blank.icc").c_str(), "wb");
-  std::fputs("mine", mine);
-  std::fclose(mine);
+  EXPECT_EQ(ProfileFiles::Read(placed).size(), BlankTemplateBytes().size());
+  ProfileFiles::Write(placed, {'m', 'i', 'n', 'e'});
   EXPECT_TRUE(PlaceBlankTemplate(win.c_str(), win.c_str()));
-  ASSERT_EQ(stat((dir + "/blank.icc").c_str(), &st), 0);
-  EXPECT_EQ(st.st_size, 4);
-  std::remove((dir + "/blank.icc").c_str());
+  EXPECT_EQ(ProfileFiles::Read(placed).size(), 4u);
+  std::remove(placed.c_str());
   EXPECT_EQ(rmdir(dir.c_str()), 0);  // nothing staged is left behind
 }
 
@@ -183,18 +155,17 @@ TEST(TempFolder, IsTheExecutablesFolderPlusTemp) {
 
 TEST(TempFolder, LongPathsAreRefusedWithoutOverrun) {
   // The folder is written into a buffer with guard bytes around the allowed size.
-  const std::string dir = "C:\\" + std::string(kTempFolderCapacity - 9, 'd');  // one too many
   struct {
     char out[kTempFolderCapacity];
     char guard[16];
   } buffer;
   std::memset(buffer.guard, 0x5A, sizeof buffer.guard);
-  EXPECT_FALSE(TempFolderFromModulePath((dir + "\\host.exe").c_str(), buffer.out, sizeof buffer.out));
+  const std::string tooLong = "C:\\" + std::string(kTempFolderCapacity - 9, 'd') + "\\host.exe";
+  EXPECT_FALSE(TempFolderFromModulePath(tooLong.c_str(), buffer.out, sizeof buffer.out));
   EXPECT_STREQ(buffer.out, "");
-  for (char g : buffer.guard) EXPECT_EQ(g, 0x5A);
   // The longest folder that fits, exactly.
-  const std::string fits = "C:\\" + std::string(kTempFolderCapacity - 10, 'e');
-  ASSERT_TRUE(TempFolderFromModulePath((fits + "\\host.exe").c_str(), buffer.out, sizeof buffer.out));
+  const std::string fits = "C:\\" + std::string(kTempFolderCapacity - 10, 'e') + "\\host.exe";
+  ASSERT_TRUE(TempFolderFromModulePath(fits.c_str(), buffer.out, sizeof buffer.out));
   EXPECT_EQ(std::strlen(buffer.out), kTempFolderCapacity - 1);
   for (char g : buffer.guard) EXPECT_EQ(g, 0x5A);
 }

@@ -6,6 +6,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <memory>
 #include <string>
 #include <vector>
@@ -54,12 +55,31 @@ class PluginTest : public ::testing::Test {
   int32_t Error() { return rt->CallGlobal("CMError").AsInteger(); }
 
   // Registers a new debugger whose events land in log, past its registration texts.
-  host::Object Debugger() {
-    host::Object d = rt->New("halvoDebugger");
+  host::Object Debugger(bool useErrorEvent = true) {
+    host::Object d = rt->New("halvoDebugger", {useErrorEvent});
     log.Attach(*rt, d);
     rt->CallGlobal("halvoRegisterDebugger", {d});
     log.entries.clear();
     return d;
+  }
+
+  // A Profile on the file at path.
+  host::Object Open(const std::string& path) { return rt->New("Profile", {rt->MakeFolderItem(path)}); }
+
+  host::Object NewVector(const std::vector<double>& values) {
+    host::Object v = rt->New("Vector");
+    for (double d : values) rt->Call(v, "Append", {d});
+    return v;
+  }
+  std::vector<double> Values(const host::Object& v) {
+    std::vector<double> out;
+    for (int i = 0; i < rt->Get(v, "size").AsInteger(); ++i) out.push_back(rt->Call(v, "Get", {i}).AsDouble());
+    return out;
+  }
+
+  // Whether the log holds text as a DebugString.
+  bool Traced(const std::string& text) const {
+    return std::find(log.entries.begin(), log.entries.end(), "DebugString:" + text) != log.entries.end();
   }
 
   host::Runtime::Options options;

@@ -11,6 +11,7 @@
 #include <climits>
 #include <fstream>
 #include <iterator>
+#include <set>
 #include <string>
 #include <vector>
 
@@ -43,6 +44,16 @@ class ProfileFiles {
     out.write(bytes.data(), static_cast<std::streamsize>(bytes.size()));
   }
   static bool Exists(const std::string& path) { return access(path.c_str(), F_OK) == 0; }
+  // The names in a folder but "." and "..".
+  static std::set<std::string> Listing(const std::string& folder) {
+    std::set<std::string> names;
+    if (DIR* dir = opendir(folder.c_str())) {
+      while (const dirent* e = readdir(dir))
+        if (std::string(e->d_name) != "." && std::string(e->d_name) != "..") names.insert(e->d_name);
+      closedir(dir);
+    }
+    return names;
+  }
 
   // The plugin's temporary folder: "temp" beside the running executable.
   static std::string PluginTempFolder() { return FolderOfExecutable() + "/temp/"; }

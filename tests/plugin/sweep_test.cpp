@@ -73,17 +73,7 @@ class SweepTest : public PluginTest {
  protected:
   void SetUp() override {
     PluginTest::SetUp();
-    profileBytes_ = ProfileFiles::Read(TINTWELL_ICC_DIR "/sRGB.icc");
     ASSERT_FALSE(profileBytes_.empty());
-    real_ = files.Path("real.icc");
-    missing_ = files.Path("missing.icc");
-    readOnly_ = files.Path("read-only.icc");
-    folder_ = files.Path("folder");
-    fifo_ = files.Path("fifo");
-    zeroLink_ = files.Path("zero");
-    danglingLink_ = files.Path("dangling");
-    loopLink_ = files.Path("loop");
-    longPath_ = files.Path("");
     while (longPath_.size() < 5000) longPath_ += "deep/";
     ResetFiles();
   }
@@ -178,31 +168,15 @@ class SweepTest : public PluginTest {
   // directory. Other programs' working folders lie beside ours and change meanwhile.
   std::set<std::string> PluginFiles() const {
     std::set<std::string> names;
-    for (const std::string& folder : {OwnWorkingFolder(), files.colorDir() + "/"})
+    const std::string own = ProfileFiles::PluginWorkingFolder();
+    EXPECT_FALSE(own.empty()) << "the plugin holds no working folder";
+    for (const std::string& folder : {own, files.colorDir() + "/"})
       if (DIR* dir = opendir(folder.c_str())) {
         while (const dirent* e = readdir(dir))
           if (e->d_name[0] != '.' && std::string(e->d_name) != "lock") names.insert(folder + e->d_name);
         closedir(dir);
       }
     return names;
-  }
-
-  // The folder whose lock the plugin keeps open.
-  static std::string OwnWorkingFolder() {
-    const std::string temp = ProfileFiles::PluginTempFolder();
-    std::string found;
-    if (DIR* fds = opendir("/proc/self/fd")) {
-      while (const dirent* e = readdir(fds)) {
-        char target[PATH_MAX];
-        const ssize_t n = readlink(("/proc/self/fd/" + std::string(e->d_name)).c_str(), target, sizeof target);
-        const std::string path(target, n > 0 ? static_cast<std::size_t>(n) : 0);
-        if (path.compare(0, temp.size(), temp) == 0 && path.size() > 5 && path.substr(path.size() - 5) == "/lock")
-          found = path.substr(0, path.size() - 4);
-      }
-      closedir(fds);
-    }
-    EXPECT_FALSE(found.empty()) << "the plugin holds no working folder";
-    return found;
   }
 
   const ClassInfo* FindClass(const std::string& name) const {
@@ -330,8 +304,11 @@ class SweepTest : public PluginTest {
   std::size_t calls_ = 0;
 
  private:
-  std::vector<char> profileBytes_;
-  std::string real_, missing_, readOnly_, folder_, fifo_, zeroLink_, danglingLink_, loopLink_, longPath_;
+  const std::vector<char> profileBytes_ = ProfileFiles::Read(TINTWELL_ICC_DIR "/sRGB.icc");
+  const std::string real_ = files.Path("real.icc"), missing_ = files.Path("missing.icc"),
+                    readOnly_ = files.Path("read-only.icc"), folder_ = files.Path("folder"), fifo_ = files.Path("fifo"),
+                    zeroLink_ = files.Path("zero"), danglingLink_ = files.Path("dangling"), loopLink_ = files.Path("loop");
+  std::string longPath_ = files.Path("");
   std::map<std::string, std::vector<Object>> pool_;
   Object debugger_;
   std::string member_;

@@ -83,19 +83,11 @@ class ProcessesTest : public PluginTest {
   std::vector<std::string> LeftInTemp() {
     std::vector<std::string> left;
     const std::string temp = files.Path("bin/temp/");
-    DIR* root = opendir(temp.c_str());
-    while (const dirent* f = root ? readdir(root) : nullptr) {
-      if (f->d_name[0] == '.') continue;
-      DIR* sub = opendir((temp + f->d_name).c_str());
-      while (const dirent* e = sub ? readdir(sub) : nullptr)
-        if (e->d_name[0] != '.' || std::strlen(e->d_name) > 2) left.push_back(std::string(f->d_name) + "/" + e->d_name);
-      if (sub) closedir(sub);
-    }
-    if (root) closedir(root);
+    for (const std::string& folder : ProfileFiles::Listing(temp))
+      for (const std::string& name : ProfileFiles::Listing(temp + folder)) left.push_back(folder + "/" + name);
     return left;
   }
 
-  Object Open(const std::string& path) { return rt->New("Profile", {rt->MakeFolderItem(path)}); }
   std::string Read(const std::string& path, const char* property) {
     Object p = Open(path);
     EXPECT_EQ(Error(), 0) << path;
@@ -153,10 +145,8 @@ TEST_F(ProcessesTest, AKilledSaveLeavesTheOldOrTheNewProfileAndNextStartCleansUp
   const std::vector<std::string> left = LeftInTemp();
   ASSERT_EQ(left.size(), 1u) << left.front();
   EXPECT_EQ(left[0].substr(left[0].find('/')), "/lock");
-  DIR* dir = opendir(files.Path("").c_str());
-  while (const dirent* e = dir ? readdir(dir) : nullptr)
-    EXPECT_NE(std::string(e->d_name).rfind(".tw-", 0), 0u) << "left beside the profile: " << e->d_name;
-  if (dir) closedir(dir);
+  for (const std::string& name : ProfileFiles::Listing(files.Path("")))
+    EXPECT_NE(name.rfind(".tw-", 0), 0u) << "left beside the profile: " << name;
 }
 
 }  // namespace

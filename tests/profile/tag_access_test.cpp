@@ -1,8 +1,6 @@
 // Profile tag access through the host: raw reads, writes, removal and shared tags on
 // real profiles (checked by Little CMS reading the saved file), every member without an
 // open profile, Name's and Copyright's lengths, and the named-colour members.
-#include <lcms2.h>
-
 #include <algorithm>
 #include <cstdint>
 #include <functional>
@@ -10,6 +8,7 @@
 #include <tuple>
 #include <vector>
 
+#include "lcms_reference.h"
 #include "plugin_fixture.h"
 #include "profile_files.h"
 
@@ -20,12 +19,6 @@ using host::Object;
 using host::Value;
 using Triple = std::vector<double>;
 using namespace std::string_literals;
-
-cmsTagSignature Sig(const std::string& s) {
-  uint32_t v = 0;
-  for (std::size_t i = 0; i < 4; ++i) v = v << 8 | (i < s.size() ? static_cast<uint8_t>(s[i]) : 0u);
-  return static_cast<cmsTagSignature>(v);
-}
 
 uint32_t BE32(const std::string& b, std::size_t at) {
   uint32_t v = 0;
@@ -41,21 +34,8 @@ uint32_t OffsetOf(const std::string& path, const std::string& sig) {
   return 0;
 }
 
-// A profile file as Little CMS reads it.
-struct Lcms {
-  explicit Lcms(const std::string& path) : h(cmsOpenProfileFromFile(path.c_str(), "r")) {}
-  ~Lcms() { cmsCloseProfile(h); }
-  std::string Raw(const char* tag) const {
-    std::string b(cmsReadRawTag(h, Sig(tag), nullptr, 0), '\0');
-    cmsReadRawTag(h, Sig(tag), &b[0], static_cast<cmsUInt32Number>(b.size()));
-    return b;
-  }
-  cmsHPROFILE h;
-};
-
 class TagAccessTest : public PluginTest {
  protected:
-  Object Open(const std::string& path) { return rt->New("Profile", {rt->MakeFolderItem(path)}); }
   Value Call(const Object& p, const std::string& m, std::initializer_list<host::Arg> args = {}) {
     return rt->Call(p, m, args);
   }
@@ -73,16 +53,16 @@ class TagAccessTest : public PluginTest {
 
 TEST_F(TagAccessTest, RawReadsRemovalWritesAndReferencesOnARealProfile) {
   const std::string f = files.Copy("sRGB.icc", "a.icc");
-  const Lcms original(f);
+  const LcmsFile original(f);
   ASSERT_NE(original.h, nullptr);
   Object p = Open(f);
   const int32_t count = rt->Get(p, "TagCount").AsInteger();
   ASSERT_EQ(count, cmsGetTagCount(original.h));
-  for (int i : {1, count}) EXPECT_EQ(Sig(Call(p, "TagName", {i}).AsString()), cmsGetTagSignature(original.h, i - 1));
+  for (int i : {1, count}) EXPECT_EQ(TagSig(Call(p, "TagName", {i}).AsString()), cmsGetTagSignature(original.h, i - 1));
   // A nil string reaches a script as the empty string.
   for (int bad : {0, -1, count + 1}) EXPECT_EQ(Call(p, "TagName", {bad}).AsString(), "") << bad;
 
-  const std::string bytes = original.Raw("cprt");
+  const std::string bytes = original.RawText("cprt");
   ASSERT_EQ(bytes.substr(0, 8), std::string("text\0\0\0\0", 8));
   EXPECT_EQ(Call(p, "TagData", {"cprt"}).AsString(), bytes);
   EXPECT_EQ(Call(p, "TagData", {count}).AsString(), bytes);
@@ -113,13 +93,13 @@ TEST_F(TagAccessTest, RawReadsRemovalWritesAndReferencesOnARealProfile) {
 
   Call(p, "SaveProfile");
   ASSERT_EQ(Error(), 0);
-  const Lcms saved(f);
+  const LcmsFile saved(f);
   ASSERT_NE(saved.h, nullptr);
   EXPECT_EQ(OffsetOf(f, "lumi"), OffsetOf(f, "wtpt"));
   EXPECT_EQ(OffsetOf(f, "bTRC"), OffsetOf(f, "rTRC"));
   EXPECT_NE(OffsetOf(f, "gTRC"), OffsetOf(f, "rTRC"));
-  EXPECT_EQ(saved.Raw("cprt"), bytes);
-  EXPECT_EQ(saved.Raw("wtpt"), wtpt);
+  EXPECT_EQ(saved.RawText("cprt"), bytes);
+  EXPECT_EQ(saved.RawText("wtpt"), wtpt);
   const auto* white = static_cast<const cmsCIEXYZ*>(cmsReadTag(saved.h, cmsSigMediaWhitePointTag));
   ASSERT_NE(white, nullptr);
   EXPECT_EQ(Three(p, "GetXYZTag", "lumi"), (Triple{white->X, white->Y, white->Z}));
@@ -242,9 +222,9 @@ TEST_F(TagAccessTest, NamedColorMembersAgreeWithLittleCms) {
   EXPECT_EQ(Call(p, "GetNamedColorName", {1}).AsString(), "");
   EXPECT_EQ(Three(p, "GetIndNamedColorPCS", 1), Triple(3, 9.0));
   rt->SetWithheld("PluginNewInstance", false);
-  const Lcms lcms(f);
+  const LcmsFile lcms(f);
   ASSERT_NE(lcms.h, nullptr);
-  const std::string raw = lcms.Raw("ncl2");
+  const std::string raw = lcms.RawText("ncl2");
   const auto* list = static_cast<const cmsNAMEDCOLORLIST*>(cmsReadTag(lcms.h, cmsSigNamedColor2Tag));
   ASSERT_NE(list, nullptr);
   const int32_t count = static_cast<int32_t>(cmsNamedColorCount(list));

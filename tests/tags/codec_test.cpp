@@ -1,17 +1,15 @@
 // The curve, XYZ, text and description codecs: what they write is compared with Little
 // CMS reading the saved profile, what they read from real profiles with Little CMS
 // reading the same file, and crafted tags that lie about their contents are refused.
-#include <lcms2.h>
-
 #include <cstdint>
 #include <cstring>
 #include <functional>
 #include <limits>
-#include <memory>
 #include <string>
 #include <vector>
 
 #include "error_state.h"
+#include "lcms_reference.h"
 #include "plugin_fixture.h"
 #include "profile.h"
 #include "profile_files.h"
@@ -23,7 +21,6 @@ namespace {
 using host::Object;
 using Bytes = std::vector<uint8_t>;
 using Trace = std::vector<std::string>;
-using Lcms = std::unique_ptr<void, decltype(&cmsCloseProfile)>;
 
 constexpr TAGTYPE Sig(const char* s) {
   return uint32_t(uint8_t(s[0])) << 24 | uint32_t(uint8_t(s[1])) << 16 | uint32_t(uint8_t(s[2])) << 8 | uint8_t(s[3]);
@@ -61,27 +58,10 @@ class CodecTest : public PluginTest {
     return rt->New("Profile", {rt->MakeFolderItem(path_)});
   }
   static HPROFILE Handle(const Object& p) { return ProfileHandle(p.get()); }
-  Lcms LcmsOpen() { return Lcms(cmsOpenProfileFromFile(path_.c_str(), "r"), &cmsCloseProfile); }
-  Lcms Saved(const Object& p) { return rt->Call(p, "SaveProfile"), LcmsOpen(); }
-  static Bytes Raw(const Lcms& p, TAGTYPE tag) {
-    Bytes b(cmsReadRawTag(p.get(), cmsTagSignature(tag), nullptr, 0));
-    cmsReadRawTag(p.get(), cmsTagSignature(tag), b.data(), cmsUInt32Number(b.size()));
-    return b;
-  }
   static void Put(HPROFILE h, TAGTYPE tag, const Bytes& bytes) {
     DWORD size = DWORD(bytes.size());
     ASSERT_TRUE(SetColorProfileElementSize(h, tag, size));
     ASSERT_TRUE(SetColorProfileElement(h, tag, 0, &size, const_cast<uint8_t*>(bytes.data())));
-  }
-  Object NewVector(const std::vector<double>& values) {
-    Object v = rt->New("Vector");
-    for (double d : values) rt->Call(v, "Append", {d});
-    return v;
-  }
-  std::vector<double> Values(const Object& v) {
-    std::vector<double> out;
-    for (int i = 0; i < rt->Get(v, "size").AsInteger(); ++i) out.push_back(rt->Call(v, "Get", {i}).AsDouble());
-    return out;
   }
   // A text read as the profile members read it, as "size|text": allocate the size the
   // first call answers, take as many bytes as the second answers.
@@ -128,7 +108,8 @@ TEST_F(CodecTest, WrittenTagsAreStoredAsLittleCmsReadsThemAndReadBack) {
   for (const auto& c : texts)
     (c.desc ? HALVO_ICMWriteTagDesc : HALVO_ICMWriteTagText)(Handle(p), Sig(c.tag), c.text.c_str());
   HALVO_ICMWriteTagXYZ(Handle(p), Sig("bkpt"), 0.9642, 1.0, -0.5);
-  Lcms saved = Saved(p);
+  rt->Call(p, "SaveProfile");
+  const LcmsFile saved(path_);
   const HPROFILE h = Handle(p);  // the profile as saved
 
   for (const auto& c : curves) {
@@ -138,9 +119,9 @@ TEST_F(CodecTest, WrittenTagsAreStoredAsLittleCmsReadsThemAndReadBack) {
     TagBytes expected("curv");
     expected.U32(uint32_t(c.entries.size()));
     for (uint16_t e : c.entries) expected.U16(e);
-    EXPECT_EQ(Raw(saved, Sig(c.tag)), expected.b) << c.tag;
+    EXPECT_EQ(saved.Raw(c.tag), expected.b) << c.tag;
   }
-  const auto* gamma = static_cast<const cmsToneCurve*>(cmsReadTag(saved.get(), cmsSigGreenTRCTag));
+  const auto* gamma = static_cast<const cmsToneCurve*>(cmsReadTag(saved.h, cmsSigGreenTRCTag));
   ASSERT_NE(gamma, nullptr);
   EXPECT_EQ(cmsGetToneCurveParams(gamma)[0], 563 / 256.0);
   for (const auto& c : texts) {
@@ -148,8 +129,8 @@ TEST_F(CodecTest, WrittenTagsAreStoredAsLittleCmsReadsThemAndReadBack) {
     TagBytes expected(c.desc ? "desc" : "text");
     if (c.desc) expected.U32(uint32_t(c.text.size() + 1));
     expected.Text(c.text).b.resize(expected.b.size() + (c.desc ? 79 : 1));  // the zero; desc's empty tail
-    EXPECT_EQ(Raw(saved, Sig(c.tag)), expected.b) << c.tag;
-    const auto* mlu = static_cast<const cmsMLU*>(cmsReadTag(saved.get(), cmsTagSignature(Sig(c.tag))));
+    EXPECT_EQ(saved.Raw(c.tag), expected.b) << c.tag;
+    const auto* mlu = static_cast<const cmsMLU*>(cmsReadTag(saved.h, cmsTagSignature(Sig(c.tag))));
     ASSERT_NE(mlu, nullptr) << c.tag;
     char text[16] = "x";
     cmsMLUgetASCII(mlu, "en", "US", text, sizeof text);
@@ -157,8 +138,8 @@ TEST_F(CodecTest, WrittenTagsAreStoredAsLittleCmsReadsThemAndReadBack) {
   }
   double xyz[3] = {};
   ASSERT_EQ(HALVO_ICMReadTagXYZ(h, Sig("bkpt"), &xyz[0], &xyz[1], &xyz[2]), 12);
-  EXPECT_EQ(Raw(saved, Sig("bkpt")), TagBytes("XYZ ").U32(0xF6D5).U32(0x10000).U32(0xFFFF8000).b);
-  const auto* black = static_cast<const cmsCIEXYZ*>(cmsReadTag(saved.get(), cmsSigMediaBlackPointTag));
+  EXPECT_EQ(saved.Raw("bkpt"), TagBytes("XYZ ").U32(0xF6D5).U32(0x10000).U32(0xFFFF8000).b);
+  const auto* black = static_cast<const cmsCIEXYZ*>(cmsReadTag(saved.h, cmsSigMediaBlackPointTag));
   ASSERT_NE(black, nullptr);
   EXPECT_EQ(std::vector<double>(xyz, xyz + 3), (std::vector<double>{black->X, black->Y, black->Z}));
 }
@@ -172,8 +153,8 @@ TEST_F(CodecTest, RealCurvesReadAsLittleCmsReadsThem) {
     rt->Call(p, "GetTRC", {"gTRC", v});
     EXPECT_EQ(Error(), 0) << name;
     const std::vector<double> values = Values(v);
-    Lcms lcms = LcmsOpen();
-    const auto* curve = static_cast<const cmsToneCurve*>(cmsReadTag(lcms.get(), cmsSigGreenTRCTag));
+    const LcmsFile lcms(path_);
+    const auto* curve = static_cast<const cmsToneCurve*>(cmsReadTag(lcms.h, cmsSigGreenTRCTag));
     ASSERT_NE(curve, nullptr) << name;
     if (cmsGetToneCurveParametricType(curve) == 1) {  // y = x^g
       EXPECT_EQ(values, std::vector<double>{cmsGetToneCurveParams(curve)[0]}) << name;
@@ -189,10 +170,10 @@ TEST_F(CodecTest, RealCurvesReadAsLittleCmsReadsThem) {
 TEST_F(CodecTest, LocalizedTextsReadAsAsciiThroughEitherReader) {
   Object p = Open("colord/sRGB.icc");
   const auto readers = {&HALVO_ICMReadTagDesc, &HALVO_ICMReadTagText};
-  Lcms lcms = LcmsOpen();
+  const LcmsFile lcms(path_);
   for (cmsTagSignature tag : {cmsSigProfileDescriptionTag, cmsSigCopyrightTag}) {
     char text[256] = "";
-    cmsMLUgetASCII(static_cast<const cmsMLU*>(cmsReadTag(lcms.get(), tag)), "en", "US", text, sizeof text);
+    cmsMLUgetASCII(static_cast<const cmsMLU*>(cmsReadTag(lcms.h, tag)), "en", "US", text, sizeof text);
     ASSERT_GT(std::string(text).size(), 3u);
     for (auto reader : readers)
       EXPECT_EQ(TwoCalls(reader, Handle(p), tag), std::to_string(strlen(text) + 1) + "|" + text);

@@ -1,17 +1,15 @@
 // cLut and the lut8/lut16 tags, driven as a script drives them: the object's values and
 // references, SetMFT's bytes as Little CMS reads them, tags that lie about their tables,
-// a real profile's table against an independent dump, and a written table at work in a
-// Little CMS transform.
-#include <lcms2.h>
+// a real profile's table against its bytes, and a written table at work in a Little CMS
+// transform.
 
 #include <algorithm>
 #include <cmath>
 #include <cstdint>
-#include <cstdio>
-#include <sstream>
 #include <string>
 #include <vector>
 
+#include "lcms_reference.h"
 #include "plugin_fixture.h"
 #include "profile_files.h"
 
@@ -21,16 +19,7 @@ using host::Object;
 using host::Value;
 using Doubles = std::vector<double>;
 
-// The A2B0 tag's raw bytes as Little CMS reads them from a profile file.
-std::vector<uint8_t> RawA2B0(const std::string& path) {
-  std::vector<uint8_t> bytes;
-  cmsHPROFILE p = cmsOpenProfileFromFile(path.c_str(), "r");
-  if (!p) return bytes;
-  bytes.resize(cmsReadRawTag(p, cmsSigAToB0Tag, nullptr, 0));
-  cmsReadRawTag(p, cmsSigAToB0Tag, bytes.data(), cmsUInt32Number(bytes.size()));
-  cmsCloseProfile(p);
-  return bytes;
-}
+std::vector<uint8_t> RawA2B0(const std::string& path) { return LcmsFile(path).Raw("A2B0"); }
 
 uint32_t U32At(const std::vector<uint8_t>& b, size_t at) {
   return at + 4 <= b.size() ? uint32_t(b[at]) << 24 | uint32_t(b[at + 1]) << 16 | uint32_t(b[at + 2]) << 8 | b[at + 3]
@@ -39,14 +28,8 @@ uint32_t U32At(const std::vector<uint8_t>& b, size_t at) {
 
 class LutTest : public PluginTest {
  protected:
-  Object Open(const std::string& path) { return rt->New("Profile", {rt->MakeFolderItem(path)}); }
   Object Member(const Object& lut, const char* name) { return rt->Get(lut, name).AsObject(); }
-  Doubles Table(const Object& lut, const char* name) {
-    Object v = Member(lut, name);
-    Doubles out;
-    for (int i = 0; i < rt->Get(v, "size").AsInteger(); ++i) out.push_back(rt->Call(v, "Get", {i}).AsDouble());
-    return out;
-  }
+  Doubles Table(const Object& lut, const char* name) { return Values(Member(lut, name)); }
   void Fill(const Object& lut, const char* name, const Doubles& values) {
     Object v = Member(lut, name);
     rt->Call(v, "Clear");
@@ -74,10 +57,6 @@ class LutTest : public PluginTest {
     rt->Set(lut, "GridPointCount", g);
     return lut;
   }
-  bool Traced(const std::string& text) {
-    return std::find(log.entries.begin(), log.entries.end(), "DebugString:" + text) != log.entries.end();
-  }
-
   ProfileFiles files;
 };
 
@@ -174,31 +153,11 @@ TEST_F(LutTest, TablesAreStoredAsLittleCmsReadsThemAndReadBack) {
     Doubles inBack;                     // the input tables read back
     std::vector<uint32_t> matrixWords;  // e00, e01, e02
   } cases[] = {
-      {false,
-       3,
-       3,
-       2,
-       Ramp(768, 256),
-       Ramp(24, 256),
-       Ramp(768, 256),
-       {1.0, -1.5, 0.3, 0, 1, 0, 0, 0, 1},
-       1608,
-       0,
-       Ramp(768, 256),
-       {0x00010000, 0xFFFE8000, 19660}},
+      {false, 3, 3, 2, Ramp(768, 256), Ramp(24, 256), Ramp(768, 256), {1.0, -1.5, 0.3, 0, 1, 0, 0, 0, 1}, 1608, 0,
+       Ramp(768, 256), {0x00010000, 0xFFFE8000, 19660}},
       {false, 1, 1, 0, {300.7, -1, 255.9}, {}, {}, kIdentity, 51, 0, {44, 255, 255}, {0x00010000, 0, 0}},
-      {true,
-       2,
-       3,
-       2,
-       Ramp(512, 65536),
-       Ramp(12, 65536),
-       Ramp(30, 65536),
-       kIdentity,
-       52 + 2 * 554,
-       0x0100000A,
-       Ramp(512, 65536),
-       {0x00010000, 0, 0}},
+      {true, 2, 3, 2, Ramp(512, 65536), Ramp(12, 65536), Ramp(30, 65536), kIdentity, 52 + 2 * 554, 0x0100000A,
+       Ramp(512, 65536), {0x00010000, 0, 0}},
       // No tables at all: no channels, or a grid of no points.
       {true, 0, 0, 0, {}, {}, {}, kIdentity, 52, 0, {}, {0x00010000, 0, 0}},
       {true, 2, 1, 0, {}, {}, {}, kIdentity, 52, 0, {}, {0x00010000, 0, 0}},
@@ -318,54 +277,31 @@ TEST_F(LutTest, AWriteThatFailsIsReportedOnce) {
   EXPECT_NE(std::search(log.entries.begin(), log.entries.end(), banner.begin(), banner.end()), log.entries.end());
 }
 
-// iccdump -v3 prints a lut16's tables scaled to 0..1: a row of the input or output tables
-// (a value per channel) or a grid point (a value per output) on each line after a colon.
-struct Dump {
-  int i = 0, o = 0, g = 0;
-  Doubles in, grid, out;
-};
-
-Dump DumpLut(const std::string& path) {
-  Dump d;
-  FILE* f = popen(("iccdump -v3 -t A2B0 '" + path + "' 2>/dev/null").c_str(), "r");
-  if (!f) return d;
-  std::vector<Doubles> rows[3];
-  int section = -1;
-  for (char line[4096]; fgets(line, sizeof line, f);) {
-    sscanf(line, " Input Channels = %d", &d.i), sscanf(line, " Output Channels = %d", &d.o);
-    sscanf(line, " CLUT resolution = %d", &d.g);
-    const std::string text = line;
-    for (const char* title : {"Input table:", "CLUT table:", "Output table:"})
-      if (text.find(title) != std::string::npos) section = title[0] == 'I' ? 0 : title[0] == 'C' ? 1 : 2;
-    if (section < 0 || text.find("table:") != std::string::npos || text.find(':') == std::string::npos) continue;
-    std::istringstream values(text.substr(text.find(':') + 1));
-    rows[section].emplace_back();
-    for (double v; values >> v;) rows[section].back().push_back(std::round(v * 65535.0));
-  }
-  pclose(f);
-  // The tag holds each channel's table whole, channel after channel.
-  for (int c = 0; c < d.i; ++c)
-    for (const Doubles& r : rows[0]) d.in.push_back(r.at(size_t(c)));
-  for (const Doubles& r : rows[1]) d.grid.insert(d.grid.end(), r.begin(), r.end());
-  for (int c = 0; c < d.o; ++c)
-    for (const Doubles& r : rows[2]) d.out.push_back(r.at(size_t(c)));
-  return d;
-}
-
-TEST_F(LutTest, ARealTableReadsAsAnIndependentDumpShowsIt) {
+// A real lut16 read by GetMFT against its bytes: the header's counts, then the input
+// tables, the grid and the output tables, 16-bit words one after another.
+TEST_F(LutTest, ARealTableReadsAsItsBytesHoldIt) {
   const std::string path = files.Copy("ghostscript/default_cmyk.icc", "cmyk.icc");
-  const Dump dump = DumpLut(path);
-  if (dump.grid.empty()) GTEST_SKIP() << "iccdump not available";
-  Object p = Open(path);
+  const std::vector<uint8_t> tag = RawA2B0(path);
+  ASSERT_EQ(U32At(tag, 0), 0x6D667432u);
+  const int i = tag[8], o = tag[9], g = tag[10], n = tag[48] << 8 | tag[49], m = tag[50] << 8 | tag[51];
+  const size_t cells = size_t(std::pow(g, i)) * size_t(o);
+  Doubles words;
+  for (size_t at = 52; at + 1 < tag.size(); at += 2) words.push_back(tag[at] << 8 | tag[at + 1]);
+  ASSERT_EQ(words.size(), size_t(i * n) + cells + size_t(o * m));
+  Object p = Open(path), d = Debugger();
   Object lut = rt->Call(p, "GetMFT", {"A2B0"}).AsObject();
   EXPECT_EQ(Error(), 0);
-  const int cells = int(std::pow(dump.g, dump.i));
-  EXPECT_EQ(Counts(lut),
-            (std::vector<int>{1, dump.g, dump.i, dump.o, int(dump.in.size()) / dump.i, int(dump.out.size()) / dump.o}));
-  EXPECT_EQ(Table(lut, "InCurve"), dump.in);
-  EXPECT_EQ(Table(lut, "Lut").size(), size_t(cells * dump.o));
-  EXPECT_EQ(Table(lut, "Lut"), dump.grid);
-  EXPECT_EQ(Table(lut, "OutCurve"), dump.out);
+  EXPECT_EQ(Counts(lut), (std::vector<int>{1, g, i, o, n, m}));
+  const std::vector<std::string> counts = {"DebugString:inChan",  "DebugInteger:" + std::to_string(i),
+                                           "DebugString:outChan", "DebugInteger:" + std::to_string(o),
+                                           "DebugString:clutPts", "DebugInteger:" + std::to_string(g)};
+  EXPECT_NE(std::search(log.entries.begin(), log.entries.end(), counts.begin(), counts.end()), log.entries.end());
+  const auto from = [&](size_t begin, size_t count) {
+    return Doubles(words.begin() + long(begin), words.begin() + long(begin + count));
+  };
+  EXPECT_EQ(Table(lut, "InCurve"), from(0, size_t(i * n)));
+  EXPECT_EQ(Table(lut, "Lut"), from(size_t(i * n), cells));
+  EXPECT_EQ(Table(lut, "OutCurve"), from(size_t(i * n) + cells, size_t(o * m)));
   EXPECT_EQ(MatrixOf(lut), kIdentity);
 }
 
