@@ -198,7 +198,7 @@ extern "C" BOOL WINAPI TranslateBitmapBits(HTRANSFORM hColorTransform, PVOID pSr
         // The band is taken a chunk at a time, so a core that runs slower (or is taken
         // away for a while) converts less of it rather than holding up the others.
         // Chunks are whole rows unless rows may be split.
-        size_t chunk = std::clamp<size_t>((end - begin) / (size_t{workers} * 8), 4096, 65536);
+        size_t chunk = std::clamp<size_t>((end - begin) / (size_t{workers} * 32), 4096, 65536);
         if (!split_rows) chunk = std::max<size_t>(1, chunk / width) * width;
         std::atomic<size_t> next{begin};
         const auto share = [&job, &next, chunk, end] {
