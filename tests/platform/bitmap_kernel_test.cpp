@@ -474,9 +474,17 @@ TEST(KernelThreads, OneWideRowSplitsAndAgrees) {
                                   BM_xBGRQUADS, 0, nullptr, 0));
   ASSERT_TRUE(TranslateBitmapBits(x.get(), in_place.data(), BM_xRGBQUADS, w, 1, 0, in_place.data(), BM_xBGRQUADS, 0,
                                   nullptr, 0));
+  // In place onto smaller pixels the row may not be cut: it is one share, wider than a
+  // chunk.
+  std::vector<BYTE> triplets = src, apart(src.size());
+  ASSERT_TRUE(TranslateBitmapBits(x.get(), triplets.data(), BM_xRGBQUADS, w, 1, w * 4, apart.data(), BM_RGBTRIPLETS,
+                                  w * 4, nullptr, 0));
+  ASSERT_TRUE(TranslateBitmapBits(x.get(), triplets.data(), BM_xRGBQUADS, w, 1, w * 4, triplets.data(),
+                                  BM_RGBTRIPLETS, w * 4, nullptr, 0));
   win32::icm::SetBitmapThreadLimit(0);
   EXPECT_TRUE(one == two);
   EXPECT_TRUE(one == in_place);
+  EXPECT_TRUE(std::equal(apart.begin(), apart.begin() + size_t{w} * 3, triplets.begin()));
 }
 
 }  // namespace
