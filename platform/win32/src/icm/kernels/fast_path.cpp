@@ -61,6 +61,8 @@ void BuildTable1(cmsHTRANSFORM exact, FastPath& fp) {
   }
 }
 
+const cmsTagSignature kRgbTrc[3] = {cmsSigRedTRCTag, cmsSigGreenTRCTag, cmsSigBlueTRCTag};
+
 bool Increasing(const std::vector<double>& curves, unsigned n) {
   for (unsigned a = 0; a < n; ++a) {
     const double* c = &curves[a * 256];
@@ -86,9 +88,8 @@ bool InputCurves(const Chain& chain, unsigned n, std::vector<double>& curves) {
   curves.assign(n * 256, 0.0);
   if (!cmsIsTag(p, tag)) {
     if (n != 3 || !cmsIsMatrixShaper(p)) return false;
-    const cmsTagSignature trc[3] = {cmsSigRedTRCTag, cmsSigGreenTRCTag, cmsSigBlueTRCTag};
     for (unsigned a = 0; a < 3; ++a) {
-      const auto* t = static_cast<const cmsToneCurve*>(cmsReadTag(p, trc[a]));
+      const auto* t = static_cast<const cmsToneCurve*>(cmsReadTag(p, kRgbTrc[a]));
       if (!t) return false;
       for (int v = 0; v < 256; ++v) curves[a * 256 + v] = cmsEvalToneCurveFloat(t, static_cast<cmsFloat32Number>(v / 255.0));
     }
@@ -228,8 +229,6 @@ struct Curves {
     }
   }
 };
-
-const cmsTagSignature kRgbTrc[3] = {cmsSigRedTRCTag, cmsSigGreenTRCTag, cmsSigBlueTRCTag};
 
 // The reverse of a matrix-shaper output profile's curves, as Little CMS makes them.
 bool ReverseOutputCurves(cmsHPROFILE dst, unsigned oc, Curves& out) {
