@@ -5,6 +5,7 @@
 #include <atomic>
 #include <chrono>
 #include <cmath>
+#include <cstring>
 #include <system_error>
 #include <thread>
 
@@ -239,19 +240,25 @@ bool ReverseOutputCurves(cmsHPROFILE dst, unsigned oc, Curves& out) {
   return true;
 }
 
-// Linear values are kept times this scale, which puts sqrt(linear) on the output
-// tables' index: sqrt(x * S) = sqrt(x) * kShaperSize.
-constexpr double kLinearScale = double{kShaperSize} * kShaperSize;
+// Linear values are kept times this scale.
+constexpr double kLinearScale = 1.0;
 
-// The output tables: the reversed curves over u = sqrt(linear), fine near black where
-// output curves are steepest.
+// The linear value whose float bits, shifted, are index i of the output tables.
+double ShaperStep(std::uint32_t i) {
+  const std::uint32_t bits = (static_cast<std::uint32_t>(kShaperBase) + i) << kShaperShift;
+  float f;
+  std::memcpy(&f, &bits, sizeof f);
+  return f;
+}
+
+// The output tables: the reversed curves at the middle of each step.
 void FillShaper(const Curves& out_curves, unsigned oc, FastPath& fp) {
-  fp.limit = static_cast<float>(kLinearScale);
+  fp.limit = 1.0f;
   fp.shaper.assign(oc * (kShaperSize + 1) + 3, 0);  // the padding lets a gather read four bytes
   for (unsigned k = 0; k < oc; ++k) {
     for (unsigned i = 0; i <= kShaperSize; ++i) {
-      const double u = std::min(i + 0.5, double{kShaperSize}) / kShaperSize;
-      const double y = cmsEvalToneCurveFloat(out_curves.c[k], static_cast<cmsFloat32Number>(u * u));
+      const double l = i == kShaperSize ? 1.0 : (ShaperStep(i) + ShaperStep(i + 1)) / 2;
+      const double y = cmsEvalToneCurveFloat(out_curves.c[k], static_cast<cmsFloat32Number>(l));
       fp.shaper[k * (kShaperSize + 1) + i] = static_cast<std::uint8_t>(std::lround(std::clamp(y, 0.0, 1.0) * 255));
     }
   }

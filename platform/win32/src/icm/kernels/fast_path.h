@@ -57,10 +57,16 @@ enum class Kind { Table1, Matrix, Clut3, Clut4, ShapedClut3, ShapedClut4, Staged
 enum class Isa { Scalar, Sse2, Avx2 };
 
 // Output tables of the matrix-shaper and linear-light paths: the output byte for each
-// of kShaperSize steps of u = sqrt(linear) in [0, 1], taken at the step's middle, and
-// one for u = 1. Steps in the square root are fine near black, where output curves are
-// steepest, and small enough everywhere that reading the table needs no interpolation.
-constexpr unsigned kShaperSize = 1u << 14;
+// step of a linear value between kShaperFloor and 1, indexed by the value's float bits
+// shifted right by kShaperShift: 2^(23 - kShaperShift) steps an octave, each taken at
+// its middle, so steps are relatively as fine near black, where output curves are
+// steepest, as near white, and reading the table needs neither a square root nor
+// interpolation. Entry kShaperSize is for 1.
+constexpr int kShaperShift = 12;
+constexpr int kShaperOctaves = 30;
+constexpr float kShaperFloor = 1.0f / (1u << kShaperOctaves);
+constexpr std::int32_t kShaperBase = (127 - kShaperOctaves) << (23 - kShaperShift);
+constexpr unsigned kShaperSize = kShaperOctaves << (23 - kShaperShift);
 // Grid points per axis of the sampled chains.
 constexpr unsigned kGrid3 = 52;
 constexpr unsigned kGrid4 = 17;
@@ -85,7 +91,7 @@ struct FastPath {
   // Matrix: lin[c][v] is column c of the matrix times the linearised level v, as
   // four floats (the last unused), scaled so that the square root lands on the output
   // tables' fixed-point index; the offset is folded into channel 0. The output tables
-  // (and the clamp of the scaled linear value) serve the ShapedClut kinds too.
+  // (and the clamp of the linear value) serve the ShapedClut kinds too.
   std::vector<float> lin;         // 3 * 256 * 4
   float limit = 0;
   std::vector<std::uint8_t> shaper;  // out_channels * (kShaperSize + 1), then 3 bytes of padding

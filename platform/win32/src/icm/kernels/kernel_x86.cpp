@@ -26,6 +26,12 @@ inline void PutBytes(std::uint32_t o, std::uint8_t x, const PixelLayout& out, st
   if (out.x >= 0) d[out.x] = x;
 }
 
+// The output tables' index for each lane of v, clamped as ops::Shape clamps it.
+inline __m128i ShaperIndex(__m128 v, __m128 limit) {
+  v = _mm_min_ps(_mm_max_ps(v, _mm_set1_ps(kShaperFloor)), limit);
+  return _mm_sub_epi32(_mm_srli_epi32(_mm_castps_si128(v), kShaperShift), _mm_set1_epi32(kShaperBase));
+}
+
 inline std::uint8_t ShapeQ(const FastPath& p, unsigned k, std::uint32_t q) { return p.shaper[k * (kShaperSize + 1) + q]; }
 
 inline void MatrixPixelSse2(const FastPath& p, const std::uint8_t* s, const PixelLayout& in, std::uint8_t* d,
@@ -35,9 +41,8 @@ inline void MatrixPixelSse2(const FastPath& p, const std::uint8_t* s, const Pixe
   const __m128 c = _mm_loadu_ps(&p.lin[(512 + s[in.at[2]]) * 4]);
   const std::uint8_t x = ops::FillerOf(s, in);
   __m128 v = _mm_add_ps(_mm_add_ps(a, b), c);
-  v = _mm_min_ps(_mm_max_ps(v, _mm_setzero_ps()), limit);
   alignas(16) std::uint32_t q[4];
-  _mm_store_si128(reinterpret_cast<__m128i*>(q), _mm_cvttps_epi32(_mm_sqrt_ps(v)));
+  _mm_store_si128(reinterpret_cast<__m128i*>(q), ShaperIndex(v, limit));
   std::uint32_t o = 0;
   for (unsigned k = 0; k < p.out_channels; ++k) o |= std::uint32_t{ShapeQ(p, k, q[k])} << (8 * k);
   PutBytes(o, x, out, d, p.out_channels);
@@ -54,7 +59,7 @@ inline void MatrixRgbSse2(const FastPath& p, const std::uint8_t* src, const Pixe
   const unsigned ib = in.bytes, ob = out.bytes, i0 = in.at[0], i1 = in.at[1], i2 = in.at[2];
   const unsigned o0 = out.at[0], o1 = out.at[1], o2 = out.at[2];
   const int ix = in.x, ox = out.x;
-  const __m128 limit = _mm_set1_ps(p.limit), zero = _mm_setzero_ps();
+  const __m128 limit = _mm_set1_ps(p.limit);
   for (std::size_t i = from; i < n; ++i) {
     const std::uint8_t* s = src + i * ib;
     std::uint8_t* d = dst + i * ob;
@@ -62,8 +67,7 @@ inline void MatrixRgbSse2(const FastPath& p, const std::uint8_t* src, const Pixe
     const __m128 a = _mm_loadu_ps(lin + s[i0] * 4);
     const __m128 b = _mm_loadu_ps(lin + (256 + s[i1]) * 4);
     const __m128 c = _mm_loadu_ps(lin + (512 + s[i2]) * 4);
-    const __m128 v = _mm_min_ps(_mm_max_ps(_mm_add_ps(_mm_add_ps(a, b), c), zero), limit);
-    const __m128i q = _mm_cvttps_epi32(_mm_sqrt_ps(v));
+    const __m128i q = ShaperIndex(_mm_add_ps(_mm_add_ps(a, b), c), limit);
     const std::uint8_t r = t0[_mm_cvtsi128_si32(q)];
     const std::uint8_t g = t1[_mm_cvtsi128_si32(_mm_srli_si128(q, 4))];
     const std::uint8_t bl = t2[_mm_cvtsi128_si32(_mm_srli_si128(q, 8))];
@@ -150,8 +154,7 @@ inline __m128i ShapedIndicesSse2(const ShapedCell& cell, __m128 limit) {
   if constexpr (N == 4) {
     v = _mm_add_ps(v, _mm_mul_ps(_mm_sub_ps(TetraSse2(cell.c + cell.k_step, sx, w), v), _mm_set1_ps(cell.k_weight)));
   }
-  v = _mm_min_ps(_mm_max_ps(v, _mm_setzero_ps()), limit);
-  return _mm_cvttps_epi32(_mm_sqrt_ps(v));
+  return ShaperIndex(v, limit);
 }
 
 // Linear-light tables run to megabytes, so most pixels miss the cache: a block of
@@ -225,8 +228,7 @@ __attribute__((target("avx2"))) inline __m128i CmykIndicesAvx2(const ShapedCell&
   const __m128 lo = _mm256_castps256_ps128(v);
   const __m128 hi = _mm256_castps256_ps128(_mm256_permutevar8x32_ps(v, next_plane));
   __m128 r = _mm_add_ps(lo, _mm_mul_ps(_mm_sub_ps(hi, lo), _mm_set1_ps(cell.k_weight)));
-  r = _mm_min_ps(_mm_max_ps(r, _mm_setzero_ps()), limit);
-  return _mm_cvttps_epi32(_mm_sqrt_ps(r));
+  return ShaperIndex(r, limit);
 }
 
 __attribute__((target("avx2"))) void CmykBlocksAvx2(const FastPath& p, const std::uint8_t* src,
@@ -408,7 +410,9 @@ __attribute__((target("avx2"))) void MatrixRgbAvx2(const FastPath& p, const std:
   const unsigned ib = in.bytes, ob = out.bytes, i0 = in.at[0], i1 = in.at[1], i2 = in.at[2];
   const unsigned o0 = out.at[0], o1 = out.at[1], o2 = out.at[2];
   const int ix = in.x, ox = out.x;
-  const __m256 limit = _mm256_set1_ps(p.limit), zero = _mm256_setzero_ps();
+  const unsigned s0 = 8 * o0, s1 = 8 * o1, s2 = 8 * o2, sx = ox >= 0 ? 8 * ox : 0, sb = 8 * ob;
+  const __m256 limit = _mm256_set1_ps(p.limit), floor = _mm256_set1_ps(kShaperFloor);
+  const __m256i base = _mm256_set1_epi32(kShaperBase);
   const auto sum = [&](const std::uint8_t* s) {
     return _mm_add_ps(_mm_add_ps(_mm_loadu_ps(lin + s[i0] * 4), _mm_loadu_ps(lin + (256 + s[i1]) * 4)),
                       _mm_loadu_ps(lin + (512 + s[i2]) * 4));
@@ -419,13 +423,22 @@ __attribute__((target("avx2"))) void MatrixRgbAvx2(const FastPath& p, const std:
     std::uint8_t* d = dst + i * ob;
     const std::uint8_t x0 = ix >= 0 ? s[ix] : 0, x1 = ix >= 0 ? s[ib + ix] : 0;
     __m256 v = _mm256_insertf128_ps(_mm256_castps128_ps256(sum(s)), sum(s + ib), 1);
-    v = _mm256_min_ps(_mm256_max_ps(v, zero), limit);
+    v = _mm256_min_ps(_mm256_max_ps(v, floor), limit);
     alignas(32) std::int32_t q[8];
-    _mm256_store_si256(reinterpret_cast<__m256i*>(q), _mm256_cvttps_epi32(_mm256_sqrt_ps(v)));
-    const std::uint8_t r0 = t0[q[0]], g0 = t1[q[1]], b0 = t2[q[2]], r1 = t0[q[4]], g1 = t1[q[5]], b1 = t2[q[6]];
-    d[o0] = r0, d[o1] = g0, d[o2] = b0;
-    d[ob + o0] = r1, d[ob + o1] = g1, d[ob + o2] = b1;
-    if (ox >= 0) d[ox] = x0, d[ob + ox] = x1;
+    _mm256_store_si256(reinterpret_cast<__m256i*>(q),
+                       _mm256_sub_epi32(_mm256_srli_epi32(_mm256_castps_si256(v), kShaperShift), base));
+    // Both pixels' bytes in one word, written as exactly their 2 * ob bytes.
+    std::uint64_t word = (std::uint64_t{t0[q[0]]} << s0) | (std::uint64_t{t1[q[1]]} << s1) |
+                         (std::uint64_t{t2[q[2]]} << s2) | (std::uint64_t{t0[q[4]]} << (s0 + sb)) |
+                         (std::uint64_t{t1[q[5]]} << (s1 + sb)) | (std::uint64_t{t2[q[6]]} << (s2 + sb));
+    if (ox >= 0) word |= (std::uint64_t{x0} << sx) | (std::uint64_t{x1} << (sx + sb));
+    std::uint8_t bytes[8];
+    for (unsigned k = 0; k < 8; ++k) bytes[k] = static_cast<std::uint8_t>(word >> (8 * k));
+    if (ob == 4) {
+      std::memcpy(d, bytes, 8);
+    } else {
+      std::memcpy(d, bytes, 6);
+    }
   }
   done = i;
 }

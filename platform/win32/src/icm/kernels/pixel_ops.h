@@ -3,8 +3,8 @@
 #ifndef TINTWELL_WIN32_ICM_KERNELS_PIXEL_OPS_H
 #define TINTWELL_WIN32_ICM_KERNELS_PIXEL_OPS_H
 
-#include <cmath>
 #include <cstdint>
+#include <cstring>
 
 #include "icm/kernels/fast_path.h"
 
@@ -12,9 +12,13 @@ namespace win32::icm::kernels::ops {
 
 inline std::uint8_t FillerOf(const std::uint8_t* s, const PixelLayout& in) { return in.x >= 0 ? s[in.x] : 0; }
 
-// Output table k read at the scaled linear value v (already clamped to 0..limit).
+// Output table k read at the linear value v, clamped to kShaperFloor..limit.
 inline std::uint8_t Shape(const FastPath& p, unsigned k, float v) {
-  return p.shaper[k * (kShaperSize + 1) + static_cast<std::uint32_t>(static_cast<std::int32_t>(std::sqrt(v)))];
+  v = v > kShaperFloor ? v : kShaperFloor;
+  v = v < p.limit ? v : p.limit;
+  std::uint32_t bits;
+  std::memcpy(&bits, &v, sizeof bits);
+  return p.shaper[k * (kShaperSize + 1) + ((bits >> kShaperShift) - kShaperBase)];
 }
 
 inline void MatrixPixel(const FastPath& p, const std::uint8_t* s, const PixelLayout& in, std::uint8_t* d,
@@ -25,10 +29,7 @@ inline void MatrixPixel(const FastPath& p, const std::uint8_t* s, const PixelLay
   const std::uint8_t x = FillerOf(s, in);
   std::uint8_t o[3];
   for (unsigned k = 0; k < p.out_channels; ++k) {
-    float v = (a[k] + b[k]) + c[k];
-    v = v > 0.0f ? v : 0.0f;
-    v = v < p.limit ? v : p.limit;
-    o[k] = Shape(p, k, v);
+    o[k] = Shape(p, k, (a[k] + b[k]) + c[k]);
   }
   for (unsigned k = 0; k < p.out_channels; ++k) d[out.at[k]] = o[k];
   if (out.x >= 0) d[out.x] = x;
@@ -121,8 +122,6 @@ inline void ShapedClutPixel(const FastPath& p, const std::uint8_t* s, const Pixe
   for (unsigned k = 0; k < p.out_channels; ++k) {
     float v = Tetra(c, sx, w, k);
     if constexpr (N == 4) v = v + (Tetra(c + k_step, sx, w, k) - v) * k_weight;
-    v = v > 0.0f ? v : 0.0f;
-    v = v < p.limit ? v : p.limit;
     o[k] = Shape(p, k, v);
   }
   for (unsigned k = 0; k < p.out_channels; ++k) d[out.at[k]] = o[k];
