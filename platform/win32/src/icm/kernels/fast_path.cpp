@@ -240,9 +240,6 @@ bool ReverseOutputCurves(cmsHPROFILE dst, unsigned oc, Curves& out) {
   return true;
 }
 
-// Linear values are kept times this scale.
-constexpr double kLinearScale = 1.0;
-
 // The linear value whose float bits, shifted, are index i of the output tables.
 double ShaperStep(std::uint32_t i) {
   const std::uint32_t bits = (static_cast<std::uint32_t>(kShaperBase) + i) << kShaperShift;
@@ -319,7 +316,7 @@ bool BuildShapedClut(const Chain& chain, cmsHTRANSFORM exact, FastPath& fp) {
   fp.linear_nodes.assign(count * oc + 8, 0.0f);  // room to read the last node as eight lanes
   for (size_t i = 0; i < count * oc; ++i) {
     // Far outside the gamut the value only needs to stay outside it.
-    fp.linear_nodes[i] = static_cast<float>(std::clamp(lin[i], -4.0, 4.0) * kLinearScale);
+    fp.linear_nodes[i] = static_cast<float>(std::clamp(lin[i], -4.0, 4.0));
   }
   FillShaper(out_curves, oc, fp);
   return true;
@@ -399,12 +396,11 @@ bool BuildMatrix(const Chain& chain, cmsHTRANSFORM exact, FastPath& fp) {
   }
 
   fp.kind = Kind::Matrix;
-  const double s = kLinearScale;
   fp.lin.assign(3 * 256 * 4, 0.0f);
   for (int c = 0; c < 3; ++c) {
     for (int v = 0; v < 256; ++v) {
       for (unsigned k = 0; k < oc; ++k) {
-        fp.lin[(c * 256 + v) * 4 + k] = static_cast<float>((a[k][c] * linear[c][v] + (c == 0 ? b[k] : 0.0)) * s);
+        fp.lin[(c * 256 + v) * 4 + k] = static_cast<float>(a[k][c] * linear[c][v] + (c == 0 ? b[k] : 0.0));
       }
     }
   }

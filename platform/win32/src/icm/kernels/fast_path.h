@@ -3,9 +3,9 @@
 // pixels in any of the 8-bit layouts:
 //   - gray input: a table of the exact result for each of the 256 levels;
 //   - matrix-shaper chains (RGB -> RGB, RGB -> gray): per-channel linearisation folded
-//     into the 3x3 matrix, then a dense output table indexed by the square root of the
-//     linear value (fine steps near black, where output curves are steepest), read with
-//     linear interpolation;
+//     into the 3x3 matrix, then a dense output table indexed by the linear value's
+//     float bits (steps as fine, relatively, near black, where output curves are
+//     steepest, as near white);
 //   - everything else (RGB or CMYK in): the whole chain sampled in double precision on
 //     a grid, read with tetrahedral (3 inputs) or 4-D simplex (CMYK) interpolation in
 //     fixed point. A CMYK grid is spaced along the input curves of the first profile's
@@ -89,9 +89,8 @@ struct FastPath {
   std::vector<std::uint8_t> table;
 
   // Matrix: lin[c][v] is column c of the matrix times the linearised level v, as
-  // four floats (the last unused), scaled so that the square root lands on the output
-  // tables' fixed-point index; the offset is folded into channel 0. The output tables
-  // (and the clamp of the linear value) serve the ShapedClut kinds too.
+  // four floats (the last unused); the offset is folded into channel 0. The output
+  // tables (and the clamp of the linear value) serve the ShapedClut kinds too.
   std::vector<float> lin;         // 3 * 256 * 4
   float limit = 0;
   std::vector<std::uint8_t> shaper;  // out_channels * (kShaperSize + 1), then 3 bytes of padding

@@ -399,7 +399,8 @@ inline void RunPerPixel(const FastPath& p, const std::uint8_t* src, const PixelL
 }
 
 // MatrixRgbSse2 two pixels at a time: both are read before either is written (in
-// place needs it), and their six channels share one square root and conversion.
+// place needs it), their six channels share one clamp and index computation, and
+// their bytes are written as one word.
 __attribute__((target("avx2"))) void MatrixRgbAvx2(const FastPath& p, const std::uint8_t* src,
                                                     const PixelLayout& in, std::uint8_t* dst, const PixelLayout& out,
                                                     std::size_t n, std::size_t& done) {
